@@ -1,1 +1,250 @@
+// Rotation of a raster about its corner (0, 0) onto a new canvas just large enough for the turned
+// rectangle: one canvas geometry, one inverse mapping, three resampling policies.
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+
 #include "kel_images.h"
+#include "outside/kel_outside.h"
+
+namespace {
+
+// Cosines, sines and source positions carry 14 fraction bits.
+constexpr int64_t kOne = 16384;
+constexpr int kFractionBits = 14;
+constexpr int64_t kFractionMask = kOne - 1;
+
+// A conforming math library stays inside [-1, 1]; clamping keeps a broken one from pushing the
+// products below out of range.
+int64_t clamped_trig(int32_t value) {
+  return value < -kOne ? -kOne : (value > kOne ? kOne : int64_t{value});
+}
+
+struct Turn {
+  int64_t cos, sin;
+};
+
+// The order of these two calls is part of the routine's observable behaviour.
+Turn turn_by(uint8_t angle) {
+  const int64_t cos = clamped_trig(tq_cos_(angle));
+  const int64_t sin = clamped_trig(tq_sin_(angle));
+  return {cos, sin};
+}
+
+int64_t min4(int64_t a, int64_t b, int64_t c, int64_t d) {
+  const int64_t ab = a < b ? a : b;
+  const int64_t cd = c < d ? c : d;
+  return ab < cd ? ab : cd;
+}
+
+int64_t max4(int64_t a, int64_t b, int64_t c, int64_t d) {
+  const int64_t ab = a > b ? a : b;
+  const int64_t cd = c > d ? c : d;
+  return ab > cd ? ab : cd;
+}
+
+// The canvas that holds the turned corners (0, 0), (W, 0), (0, H) and (W, H), plus one row and
+// one column. Worked in 64 bits: for sides below 16384 nothing here comes near 32 bits, so this
+// equals the 32-bit arithmetic; above that it is still the true rotation instead of a wrapped one.
+struct CanvasGeometry {
+  int64_t height, width, offset_y, offset_x;
+};
+
+CanvasGeometry turned_canvas(int64_t height, int64_t width, Turn a) {
+  // C++ division truncates toward zero, so a negative extent shrinks toward 0 like a positive one.
+  const int64_t x1 = a.cos * width / kOne;
+  const int64_t x2 = -(a.sin * height / kOne);
+  const int64_t x3 = (a.cos * width - a.sin * height) / kOne;
+  const int64_t y1 = a.sin * width / kOne;
+  const int64_t y2 = a.cos * height / kOne;
+  const int64_t y3 = (a.sin * width + a.cos * height) / kOne;
+  const int64_t x_min = min4(0, x1, x2, x3);
+  const int64_t y_min = min4(0, y1, y2, y3);
+  return {max4(0, y1, y2, y3) - y_min + 1, max4(0, x1, x2, x3) - x_min + 1, -y_min, -x_min};
+}
+
+// Sides that the int32_t outputs can carry and a byte count that malloc can be asked for.
+bool representable(const CanvasGeometry &g) {
+  if (g.height > INT32_MAX || g.width > INT32_MAX) return false;
+  const uint64_t bytes = static_cast<uint64_t>(g.height) * static_cast<uint64_t>(g.width);
+  return bytes <= SIZE_MAX;
+}
+
+// Floor and ceiling of a / b for b > 0 (C++ division alone truncates toward zero).
+int64_t floor_div(int64_t a, int64_t b) {
+  const int64_t q = a / b;
+  return (a % b != 0 && a < 0) ? q - 1 : q;
+}
+
+int64_t ceil_div(int64_t a, int64_t b) {
+  const int64_t q = a / b;
+  return (a % b != 0 && a > 0) ? q + 1 : q;
+}
+
+// Half-open column range [first, last) of a canvas row.
+struct Span {
+  int64_t first, last;
+};
+
+// The columns k of [0, columns) whose position slope * k + start lies in [low, high). The
+// position is linear in k, so they form one run.
+Span columns_inside(int64_t slope, int64_t start, int64_t low, int64_t high, int64_t columns) {
+  Span span{0, columns};
+  if (low >= high) return {0, 0};
+  if (slope == 0) return (low <= start && start < high) ? span : Span{0, 0};
+  if (slope > 0) {
+    span.first = ceil_div(low - start, slope);
+    span.last = floor_div(high - 1 - start, slope) + 1;
+  } else {
+    span.first = ceil_div(start - (high - 1), -slope);
+    span.last = floor_div(start - low, -slope) + 1;
+  }
+  if (span.first < 0) span.first = 0;
+  if (span.last > columns) span.last = columns;
+  return span;
+}
+
+// A source raster as the resampling policies read it. Positions handed to read() always lie
+// inside, so the index never leaves the caller's height * width pixels.
+template <typename Pixel>
+struct Source {
+  const Pixel *pixels;
+  int64_t height, width;
+  int32_t at(int64_t x, int64_t y) const {
+    return pixels[static_cast<size_t>(y) * static_cast<size_t>(width) + static_cast<size_t>(x)];
+  }
+};
+
+// Bilinear weights of the four neighbours: the sum is 2^28 times a weighted mean of them, in 64
+// bits because it reaches 255 * 2^28.
+template <typename Pixel>
+int64_t bilinear_total(const Source<Pixel> &src, int64_t x0, int64_t y0, int32_t fx, int32_t fy) {
+  const int32_t ax = static_cast<int32_t>(kOne) - fx;
+  const int32_t ay = static_cast<int32_t>(kOne) - fy;
+  const int32_t top = ax * src.at(x0, y0) + fx * src.at(x0 + 1, y0);
+  const int32_t bottom = ax * src.at(x0, y0 + 1) + fx * src.at(x0 + 1, y0 + 1);
+  return int64_t{ay} * top + int64_t{fy} * bottom;
+}
+
+// The three resamplings. kReach is how many columns (and rows) past the position's whole part
+// are read: a position is resampled only when its whole part lies in [0, side - kReach).
+struct UnsignedBilinear {
+  using Pixel = uint8_t;
+  static constexpr uint8_t kFill = 255;
+  static constexpr int64_t kReach = 1;
+  static uint8_t resample(const Source<uint8_t> &src, int64_t x0, int64_t y0, int32_t fx,
+                          int32_t fy) {
+    // Never negative, so the shift is the truncating division by 2^28.
+    return static_cast<uint8_t>(bilinear_total(src, x0, y0, fx, fy) >> 28);
+  }
+};
+
+struct SignedBilinear {
+  using Pixel = int8_t;
+  static constexpr int8_t kFill = 0;
+  static constexpr int64_t kReach = 1;
+  static int8_t resample(const Source<int8_t> &src, int64_t x0, int64_t y0, int32_t fx,
+                         int32_t fy) {
+    const int64_t total = bilinear_total(src, x0, y0, fx, fy);
+    // Truncate toward zero: -0.5 becomes 0, not -1 as a plain arithmetic shift would give.
+    const int64_t toward_zero = total < 0 ? total + ((int64_t{1} << 28) - 1) : total;
+    return static_cast<int8_t>(toward_zero >> 28);
+  }
+};
+
+struct SignedNearest {
+  using Pixel = int8_t;
+  static constexpr int8_t kFill = -128;
+  static constexpr int64_t kReach = 0;
+  static int8_t resample(const Source<int8_t> &src, int64_t x, int64_t y, int32_t, int32_t) {
+    // -128 marks the canvas pixels the source does not cover, so a covered -128 becomes -127.
+    const int32_t value = src.at(x, y);
+    return static_cast<int8_t>(value == -128 ? -127 : value);
+  }
+};
+
+// Maps every canvas pixel back through the opposite turn and resamples the source there. The
+// position is linear along a row, so each row first finds the run of columns whose position is
+// inside the source and then steps through it by (cos, sin); pixels outside keep the fill and are
+// not visited. Stepping is exact integer algebra, so the positions equal those computed afresh.
+template <typename Policy>
+void resample_canvas(const Source<typename Policy::Pixel> &src, const CanvasGeometry &g, Turn b,
+                     typename Policy::Pixel *canvas) {
+  // A whole part in [0, side - kReach) is a fixed-point position in [0, (side - kReach) * 16384).
+  const int64_t x_high = (src.width - Policy::kReach) * kOne;
+  const int64_t y_high = (src.height - Policy::kReach) * kOne;
+  for (int64_t r = 0; r < g.height; ++r) {
+    const int64_t dy = r - g.offset_y;
+    // Source position of canvas column 0 of this row.
+    const int64_t sx0 = -b.cos * g.offset_x - b.sin * dy;
+    const int64_t sy0 = -b.sin * g.offset_x + b.cos * dy;
+    const Span in_x = columns_inside(b.cos, sx0, 0, x_high, g.width);
+    const Span in_y = columns_inside(b.sin, sy0, 0, y_high, g.width);
+    const int64_t first = in_x.first > in_y.first ? in_x.first : in_y.first;
+    const int64_t last = in_x.last < in_y.last ? in_x.last : in_y.last;
+    if (first >= last) continue;
+    typename Policy::Pixel *out = canvas + static_cast<size_t>(r) * static_cast<size_t>(g.width);
+    int64_t sx = sx0 + b.cos * first;
+    int64_t sy = sy0 + b.sin * first;
+    for (int64_t k = first; k < last; ++k, sx += b.cos, sy += b.sin) {
+      out[k] = Policy::resample(src, sx >> kFractionBits, sy >> kFractionBits,
+                                static_cast<int32_t>(sx & kFractionMask),
+                                static_cast<int32_t>(sy & kFractionMask));
+    }
+  }
+}
+
+// Canvas geometry, allocation and fill, then the inverse mapping. All five outputs are written
+// before any pixel is resampled; when no canvas can be made the opposite turn is not asked for.
+template <typename Policy>
+void rotate(const typename Policy::Pixel *pixels, int64_t height, int64_t width, uint8_t angle,
+            typename Policy::Pixel **canvas, int32_t *canvas_height, int32_t *canvas_width,
+            int32_t *offset_y, int32_t *offset_x) {
+  using Pixel = typename Policy::Pixel;
+  const CanvasGeometry g = turned_canvas(height, width, turn_by(angle));
+  if (!representable(g)) {
+    *canvas = nullptr;
+    *canvas_height = *canvas_width = *offset_y = *offset_x = 0;
+    return;
+  }
+  const size_t bytes = static_cast<size_t>(g.height) * static_cast<size_t>(g.width);
+  Pixel *block = static_cast<Pixel *>(std::malloc(bytes));
+  *canvas = block;
+  *canvas_height = static_cast<int32_t>(g.height);
+  *canvas_width = static_cast<int32_t>(g.width);
+  *offset_y = static_cast<int32_t>(g.offset_y);
+  *offset_x = static_cast<int32_t>(g.offset_x);
+  if (block == nullptr) return;
+  const Pixel fill = Policy::kFill;
+  std::memset(block, static_cast<unsigned char>(fill), bytes);
+  const Turn opposite = turn_by(static_cast<uint8_t>(-angle & 255));
+  resample_canvas<Policy>(Source<Pixel>{pixels, height, width}, g, opposite, block);
+}
+
+}  // namespace
+
+extern "C" {
+
+void kel_image_rotate(const uint8_t *src, uint32_t height, uint32_t width, uint8_t angle,
+                      uint8_t **canvas, int32_t *canvas_height, int32_t *canvas_width,
+                      int32_t *offset_y, int32_t *offset_x) {
+  rotate<UnsignedBilinear>(src, height, width, angle, canvas, canvas_height, canvas_width, offset_y,
+                           offset_x);
+}
+
+void kel_image_rotate_int8(const int8_t *src, uint32_t height, uint32_t width, uint8_t angle,
+                           int8_t **canvas, int32_t *canvas_height, int32_t *canvas_width,
+                           int32_t *offset_y, int32_t *offset_x) {
+  rotate<SignedBilinear>(src, height, width, angle, canvas, canvas_height, canvas_width, offset_y,
+                         offset_x);
+}
+
+void kel_image_rotate_int8_nn(const int8_t *src, int32_t height, int32_t width, uint8_t angle,
+                              int8_t **canvas, int32_t *canvas_height, int32_t *canvas_width,
+                              int32_t *offset_y, int32_t *offset_x) {
+  rotate<SignedNearest>(src, height, width, angle, canvas, canvas_height, canvas_width, offset_y,
+                        offset_x);
+}
+
+}  // extern "C"

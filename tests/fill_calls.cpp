@@ -1,0 +1,325 @@
+// The masked fill's calls to its two sibling functions, seen through recording stand-ins. This
+// program links the library proper only, so the stand-ins below are the functions it calls.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <random>
+#include <utility>
+#include <vector>
+
+#include "kel_images.h"
+#include "kel_outside.h"
+
+namespace {
+
+using Bytes = std::vector<uint8_t>;
+
+struct Call {
+  bool is_blur;
+  const uint8_t *in;
+  uint16_t in_height, in_width;
+  uint8_t *out;
+  uint16_t factor, out_height, out_width;  // enlargement only
+  Bytes input;                             // what `in` held at the call
+};
+
+std::vector<Call> g_calls;
+
+// What the stand-ins write, easy to tell apart: the blur inverts, the enlargement writes a
+// pattern of the output offset.
+uint8_t blur_result(uint8_t value) {
+  return static_cast<uint8_t>(255 - value);
+}
+uint8_t enlarged_at(size_t offset) {
+  return static_cast<uint8_t>(offset * 13 + 7);
+}
+
+}  // namespace
+
+extern "C" {
+
+void kel_blur_uint8(const uint8_t *in, uint16_t height, uint16_t width, uint8_t *out) {
+  const size_t count = size_t{height} * width;
+  g_calls.push_back({true, in, height, width, out, 0, 0, 0, Bytes(in, in + count)});
+  for (size_t i = 0; i < count; ++i) out[i] = blur_result(in[i]);
+}
+
+void kel_scale_up_bilinear_uint8(const uint8_t *in, uint16_t in_height, uint16_t in_width,
+                                 uint16_t factor, uint8_t *out, uint16_t out_height,
+                                 uint16_t out_width) {
+  const size_t count = size_t{in_height} * in_width;
+  g_calls.push_back(
+      {false, in, in_height, in_width, out, factor, out_height, out_width, Bytes(in, in + count)});
+  for (size_t i = 0; i < size_t{out_height} * out_width; ++i) out[i] = enlarged_at(i);
+}
+
+// The library proper also calls the math functions; they must exist for a shared build to link.
+int32_t tq_cos_(uint8_t) {
+  return 16384;
+}
+int32_t tq_sin_(uint8_t) {
+  return 0;
+}
+uint32_t tq_sqrt_24_5(uint32_t) {
+  return 0;
+}
+
+}  // extern "C"
+
+namespace {
+
+struct Picture {
+  uint16_t height, width;
+  Bytes src, mask;
+  bool hole(int x, int y) const { return mask[static_cast<size_t>(y) * width + x] == 0; }
+  bool interior(int x, int y) const {
+    return x >= 1 && y >= 1 && x + 2 <= width && y + 2 <= height;
+  }
+  bool next_to(int x, int y, bool want_hole) const {
+    for (int dy = -1; dy <= 1; ++dy) {
+      for (int dx = -1; dx <= 1; ++dx) {
+        const int nx = x + dx, ny = y + dy;
+        if ((dx || dy) && nx >= 0 && ny >= 0 && nx < width && ny < height &&
+            hole(nx, ny) == want_hole) {
+          return true;
+        }
+      }
+    }
+    return false;
+  }
+  uint16_t grid_height() const { return static_cast<uint16_t>((height + 7) / 8); }
+  uint16_t grid_width() const { return static_cast<uint16_t>((width + 7) / 8); }
+};
+
+// Runs the fill and returns the calls it made.
+std::vector<Call> run(const Picture &p, Bytes &dst) {
+  g_calls.clear();
+  kel_mask_image(p.src.data(), p.height, p.width, p.mask.data(), dst.data());
+  return g_calls;
+}
+
+// Per cell, the largest source value among the border pixels (interior known pixels next to
+// the hole), then every empty cell takes the largest value among the filled cells nearest to it
+// (Chebyshev distance): that is what passes of one ring each produce.
+Bytes expected_grid(const Picture &p) {
+  const int grid_height = p.grid_height(), grid_width = p.grid_width();
+  Bytes gathered(static_cast<size_t>(grid_height) * grid_width, 0);
+  for (int y = 0; y < p.height; ++y) {
+    for (int x = 0; x < p.width; ++x) {
+      if (!p.hole(x, y) && p.interior(x, y) && p.next_to(x, y, true)) {
+        uint8_t &cell = gathered[static_cast<size_t>(y / 8) * grid_width + x / 8];
+        cell = std::max(cell, p.src[static_cast<size_t>(y) * p.width + x]);
+      }
+    }
+  }
+  Bytes grid = gathered;
+  for (int cy = 0; cy < grid_height; ++cy) {
+    for (int cx = 0; cx < grid_width; ++cx) {
+      int nearest = INT32_MAX;
+      uint8_t value = 0;
+      for (int sy = 0; sy < grid_height; ++sy) {
+        for (int sx = 0; sx < grid_width; ++sx) {
+          const uint8_t seed = gathered[static_cast<size_t>(sy) * grid_width + sx];
+          const int distance = std::max(std::abs(sx - cx), std::abs(sy - cy));
+          if (seed == 0 || distance > nearest) continue;
+          value = distance < nearest ? seed : std::max(value, seed);
+          nearest = distance;
+        }
+      }
+      grid[static_cast<size_t>(cy) * grid_width + cx] = value;
+    }
+  }
+  return grid;
+}
+
+Picture random_picture(uint16_t height, uint16_t width, uint32_t seed) {
+  std::mt19937 generator(seed);
+  std::uniform_int_distribution<int> value(0, 255), hole(0, 4);
+  Picture p{height, width, Bytes(size_t{height} * width), Bytes(size_t{height} * width)};
+  for (uint8_t &v : p.src) v = static_cast<uint8_t>(value(generator));
+  for (uint8_t &m : p.mask)
+    m = static_cast<uint8_t>(hole(generator) == 0 ? 0 : 1 + value(generator) % 255);
+  return p;
+}
+
+// One hole pixel at (x, y) whose eight neighbours, its only border pixels, hold `value`.
+void seed_cell(Picture &p, int x, int y, uint8_t value) {
+  p.mask[static_cast<size_t>(y) * p.width + x] = 0;
+  for (int dy = -1; dy <= 1; ++dy) {
+    for (int dx = -1; dx <= 1; ++dx) {
+      if (dx || dy) p.src[static_cast<size_t>(y + dy) * p.width + x + dx] = value;
+    }
+  }
+}
+
+Picture blank_picture(uint16_t height, uint16_t width) {
+  return Picture{height, width, Bytes(size_t{height} * width, 0), Bytes(size_t{height} * width, 1)};
+}
+
+TEST(FillCalls, ArgumentsOrderAndWhatIsDoneWithTheResults) {
+  for (bool in_place : {false, true}) {
+    SCOPED_TRACE(in_place ? "in place" : "separate destination");
+    const Picture p = random_picture(20, 27, 1);
+    Bytes dst = in_place ? p.src : Bytes(p.src.size(), 0xEE);
+    g_calls.clear();
+    const uint8_t *source = in_place ? dst.data() : p.src.data();
+    kel_mask_image(source, p.height, p.width, p.mask.data(), dst.data());
+    const std::vector<Call> calls = g_calls;
+    ASSERT_EQ(calls.size(), 3u);
+
+    const Call &grid_blur = calls[0], &enlarge = calls[1], &image_blur = calls[2];
+    EXPECT_TRUE(grid_blur.is_blur);
+    EXPECT_EQ(grid_blur.in, grid_blur.out);  // the grid is smoothed in place
+    EXPECT_EQ(grid_blur.in_height, 3);
+    EXPECT_EQ(grid_blur.in_width, 4);
+    EXPECT_EQ(grid_blur.input, expected_grid(p));
+
+    EXPECT_FALSE(enlarge.is_blur);
+    EXPECT_EQ(enlarge.in, grid_blur.out);
+    EXPECT_EQ(enlarge.in_height, 3);
+    EXPECT_EQ(enlarge.in_width, 4);
+    EXPECT_EQ(enlarge.factor, 8);
+    EXPECT_EQ(enlarge.out_height, 24);
+    EXPECT_EQ(enlarge.out_width, 32);
+    Bytes smoothed = grid_blur.input;
+    for (uint8_t &v : smoothed) v = blur_result(v);
+    EXPECT_EQ(enlarge.input, smoothed);
+
+    EXPECT_TRUE(image_blur.is_blur);
+    EXPECT_EQ(image_blur.in, dst.data());
+    EXPECT_EQ(image_blur.in_height, 20);
+    EXPECT_EQ(image_blur.in_width, 27);
+    EXPECT_NE(image_blur.out, dst.data());
+    EXPECT_NE(image_blur.out, enlarge.out);
+    EXPECT_NE(image_blur.out, grid_blur.out);
+    EXPECT_NE(enlarge.out, grid_blur.out);
+
+    // Holes take the enlarged raster (row stride 32); the interior seam then the blurred image.
+    for (int y = 0; y < p.height; ++y) {
+      for (int x = 0; x < p.width; ++x) {
+        SCOPED_TRACE(testing::Message() << "(" << x << ", " << y << ")");
+        const size_t i = static_cast<size_t>(y) * p.width + x;
+        const uint8_t filled =
+            p.hole(x, y) ? enlarged_at(static_cast<size_t>(y) * 32 + x) : p.src[i];
+        ASSERT_EQ(image_blur.input[i], filled);
+        const bool seam = p.hole(x, y) && p.interior(x, y) && p.next_to(x, y, false);
+        ASSERT_EQ(dst[i], seam ? blur_result(filled) : filled);
+      }
+    }
+  }
+}
+
+TEST(FillCalls, ZeroSizesStillCallBothSiblings) {
+  struct SizeCase {
+    uint16_t height, width, grid_height, grid_width;
+  };
+  const SizeCase kSizes[] = {{0, 5, 0, 1}, {5, 0, 1, 0}, {0, 0, 0, 0}, {0, 65528, 0, 8191}};
+  const Bytes src(4, 9), mask(4, 0);
+  for (const SizeCase &c : kSizes) {
+    SCOPED_TRACE(testing::Message() << c.height << " x " << c.width);
+    Bytes dst(4, 0xEE);
+    g_calls.clear();
+    kel_mask_image(src.data(), c.height, c.width, mask.data(), dst.data());
+    EXPECT_EQ(dst, Bytes(4, 0xEE));
+    ASSERT_EQ(g_calls.size(), 3u);
+    EXPECT_EQ(g_calls[0].in, g_calls[0].out);
+    EXPECT_EQ(g_calls[0].in_height, c.grid_height);
+    EXPECT_EQ(g_calls[0].in_width, c.grid_width);
+    EXPECT_EQ(g_calls[1].in_height, c.grid_height);
+    EXPECT_EQ(g_calls[1].in_width, c.grid_width);
+    EXPECT_EQ(g_calls[1].out_height, c.grid_height * 8);
+    EXPECT_EQ(g_calls[1].out_width, c.grid_width * 8);
+    EXPECT_EQ(g_calls[2].in, dst.data());
+    EXPECT_EQ(g_calls[2].in_height, c.height);
+    EXPECT_EQ(g_calls[2].in_width, c.width);
+  }
+}
+
+TEST(FillCalls, SidesBeyondTheEnlargedRangeReturnAtOnce) {
+  for (auto size : {std::pair<uint16_t, uint16_t>{65529, 1}, {1, 65529}, {65535, 1}}) {
+    const Bytes src(65535, 9), mask(65535, 0);
+    Bytes dst(65535, 0xEE);
+    g_calls.clear();
+    kel_mask_image(src.data(), size.first, size.second, mask.data(), dst.data());
+    EXPECT_TRUE(g_calls.empty());
+    EXPECT_EQ(dst, Bytes(65535, 0xEE));
+  }
+}
+
+// The grid that reaches the first blur: gathered maxima, then one ring per dilation pass.
+TEST(FillCalls, GridIsGatheredAndDilated) {
+  struct Seed {
+    int x, y;
+    uint8_t value;
+  };
+  struct GridCase {
+    const char *what;
+    uint16_t height, width;
+    std::vector<Seed> seeds;
+    Bytes grid;  // empty: the grid is checked against expected_grid only
+  };
+  const GridCase kCases[] = {
+      {"one cell at a corner fills the whole grid", 40, 56, {{3, 3, 90}}, Bytes(35, 90)},
+      {"one cell in the middle", 40, 56, {{27, 19, 90}}, Bytes(35, 90)},
+      {"one cell at the far corner", 40, 56, {{52, 36, 90}}, Bytes(35, 90)},
+      {"equal distance takes the larger", 8, 24, {{3, 3, 30}, {19, 3, 70}}, {30, 70, 70}},
+      {"the nearer value wins", 8, 32, {{3, 3, 30}, {27, 3, 70}}, {30, 30, 70, 70}},
+      {"nearer smaller value wins", 8, 40, {{3, 3, 70}, {35, 3, 30}}, {70, 70, 70, 30, 30}},
+      {"two fronts meeting", 48, 64, {{11, 11, 200}, {52, 36, 40}}, {}},
+      {"several values in one cell: the largest", 16, 16, {{3, 3, 10}, {4, 5, 99}}, Bytes(4, 99)},
+      {"border pixels of value 0 mark nothing", 16, 24, {{3, 3, 0}, {19, 11, 55}}, Bytes(6, 55)},
+      {"last cells cover fewer pixels", 19, 21, {{18, 3, 80}, {3, 17, 20}}, {}},
+      {"one column of cells", 40, 8, {{3, 19, 66}}, Bytes(5, 66)},
+      {"one row of cells", 8, 40, {{19, 3, 66}}, Bytes(5, 66)},
+      {"a grid wider than one strip",
+       24,
+       2100,
+       {{3, 3, 10}, {900, 12, 200}, {2060, 19, 120}, {2090, 3, 250}},
+       {}},
+      {"a tall grid", 2100, 24, {{12, 3, 90}, {3, 1000, 30}, {20, 2090, 140}}, {}},
+  };
+  for (const GridCase &c : kCases) {
+    SCOPED_TRACE(c.what);
+    Picture p = blank_picture(c.height, c.width);
+    for (const Seed &s : c.seeds) seed_cell(p, s.x, s.y, s.value);
+    Bytes dst(p.src.size());
+    const std::vector<Call> calls = run(p, dst);
+    ASSERT_EQ(calls.size(), 3u);
+    if (!c.grid.empty()) {
+      EXPECT_EQ(calls[0].input, c.grid);
+    }
+    EXPECT_EQ(calls[0].input, expected_grid(p));
+  }
+}
+
+// A hole right beside an edge of the column pieces in which the edge walker looks for holes,
+// its only higher border pixels on the other side of that edge.
+TEST(FillCalls, BorderPixelsBesideAHoleAcrossAPieceEdge) {
+  for (int x : {64, 65, 128, 129, 192, 193}) {
+    SCOPED_TRACE(x);
+    Picture p = blank_picture(16, 200);
+    std::fill(p.src.begin(), p.src.end(), 10);
+    p.mask[size_t{8} * p.width + x] = 0;
+    const int border_x = x % 2 == 0 ? x + 1 : x - 1;
+    for (int y = 7; y <= 9; ++y) p.src[static_cast<size_t>(y) * p.width + border_x] = 77;
+    Bytes dst(p.src.size());
+    const std::vector<Call> calls = run(p, dst);
+    ASSERT_EQ(calls.size(), 3u);
+    EXPECT_EQ(calls[0].input, expected_grid(p));
+  }
+}
+
+TEST(FillCalls, RandomPicturesGatherTheLargestBorderValue) {
+  for (uint32_t seed = 0; seed < 8; ++seed) {
+    const Picture p = random_picture(static_cast<uint16_t>(17 + seed * 5),
+                                     static_cast<uint16_t>(40 - seed * 3), seed);
+    Bytes dst(p.src.size());
+    const std::vector<Call> calls = run(p, dst);
+    ASSERT_EQ(calls.size(), 3u);
+    EXPECT_EQ(calls[0].input, expected_grid(p)) << seed;
+  }
+}
+
+}  // namespace
