@@ -5,8 +5,9 @@ prefix=$1
 here=$(cd "$(dirname "$0")" && pwd)
 out=$(mktemp -d)
 export PKG_CONFIG_PATH="$prefix/lib/pkgconfig:$prefix/lib64/pkgconfig:$prefix/lib/x86_64-linux-gnu/pkgconfig"
-cc -std=c99 "$here/host.c" $(pkg-config --cflags --libs kel_images) -o "$out/c_host"
-c++ -std=c++17 "$here/host.cpp" $(pkg-config --cflags --libs kel_images) -o "$out/cpp_host"
+flags=$(pkg-config --cflags --libs kel_images)  # a separate step, so that a failure stops here
+cc -std=c99 -Werror "$here/host.c" $flags -o "$out/c_host"
+c++ -std=c++17 -Werror "$here/host.cpp" $flags -o "$out/cpp_host"
 LD_LIBRARY_PATH="$prefix/lib" "$out/c_host"
 LD_LIBRARY_PATH="$prefix/lib" "$out/cpp_host"
 rm -rf "$out"
