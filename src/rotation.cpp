@@ -7,6 +7,9 @@
 
 #include "kel_images.h"
 #include "outside/kel_outside.h"
+#if KEL_USE_HIGHWAY
+#include "simd/rotation_simd.h"
+#endif
 
 namespace {
 
@@ -129,6 +132,7 @@ int64_t bilinear_total(const Source<Pixel> &src, int64_t x0, int64_t y0, int32_t
 
 // The three resamplings. kReach is how many columns (and rows) past the position's whole part
 // are read: a position is resampled only when its whole part lies in [0, side - kReach).
+// resample_run hands a run of a row to the vector variant, which does the first pixels of it.
 struct UnsignedBilinear {
   using Pixel = uint8_t;
   static constexpr uint8_t kFill = 255;
@@ -138,6 +142,11 @@ struct UnsignedBilinear {
     // Never negative, so the shift is the truncating division by 2^28.
     return static_cast<uint8_t>(bilinear_total(src, x0, y0, fx, fy) >> 28);
   }
+#if KEL_USE_HIGHWAY
+  static size_t resample_run(const kel::simd::RotationRow &row, uint8_t *out) {
+    return kel::simd::rotate_row_bilinear(row, out);
+  }
+#endif
 };
 
 struct SignedBilinear {
@@ -151,6 +160,11 @@ struct SignedBilinear {
     const int64_t toward_zero = total < 0 ? total + ((int64_t{1} << 28) - 1) : total;
     return static_cast<int8_t>(toward_zero >> 28);
   }
+#if KEL_USE_HIGHWAY
+  static size_t resample_run(const kel::simd::RotationRow &row, int8_t *out) {
+    return kel::simd::rotate_row_bilinear(row, out);
+  }
+#endif
 };
 
 struct SignedNearest {
@@ -162,6 +176,11 @@ struct SignedNearest {
     const int32_t value = src.at(x, y);
     return static_cast<int8_t>(value == -128 ? -127 : value);
   }
+#if KEL_USE_HIGHWAY
+  static size_t resample_run(const kel::simd::RotationRow &row, int8_t *out) {
+    return kel::simd::rotate_row_nearest(row, out);
+  }
+#endif
 };
 
 // Maps every canvas pixel back through the opposite turn and resamples the source there. The
@@ -174,6 +193,12 @@ void resample_canvas(const Source<typename Policy::Pixel> &src, const CanvasGeom
   // A whole part in [0, side - kReach) is a fixed-point position in [0, (side - kReach) * 16384).
   const int64_t x_high = (src.width - Policy::kReach) * kOne;
   const int64_t y_high = (src.height - Policy::kReach) * kOne;
+#if KEL_USE_HIGHWAY
+  // The vector variants work in 32-bit lanes: positions inside a source below 2^16 on each side
+  // stay below 2^30, and byte offsets below 2^31. The nearest one reads 4 bytes at a time.
+  const bool vectors = src.width < (1 << 16) && src.height < (1 << 16) &&
+                       src.width * src.height < (int64_t{1} << 31) && src.width * src.height >= 4;
+#endif
   for (int64_t r = 0; r < g.height; ++r) {
     const int64_t dy = r - g.offset_y;
     // Source position of canvas column 0 of this row.
@@ -185,9 +210,26 @@ void resample_canvas(const Source<typename Policy::Pixel> &src, const CanvasGeom
     const int64_t last = in_x.last < in_y.last ? in_x.last : in_y.last;
     if (first >= last) continue;
     typename Policy::Pixel *out = canvas + static_cast<size_t>(r) * static_cast<size_t>(g.width);
+    int64_t k = first;
     int64_t sx = sx0 + b.cos * first;
     int64_t sy = sy0 + b.sin * first;
-    for (int64_t k = first; k < last; ++k, sx += b.cos, sy += b.sin) {
+#if KEL_USE_HIGHWAY
+    if (vectors) {
+      const kel::simd::RotationRow run{src.pixels,
+                                       static_cast<int32_t>(src.height),
+                                       static_cast<int32_t>(src.width),
+                                       static_cast<int32_t>(sx),
+                                       static_cast<int32_t>(sy),
+                                       static_cast<int32_t>(b.cos),
+                                       static_cast<int32_t>(b.sin),
+                                       static_cast<size_t>(last - first)};
+      const auto done = static_cast<int64_t>(Policy::resample_run(run, out + first));
+      k += done;
+      sx += b.cos * done;
+      sy += b.sin * done;
+    }
+#endif
+    for (; k < last; ++k, sx += b.cos, sy += b.sin) {
       out[k] = Policy::resample(src, sx >> kFractionBits, sy >> kFractionBits,
                                 static_cast<int32_t>(sx & kFractionMask),
                                 static_cast<int32_t>(sy & kFractionMask));

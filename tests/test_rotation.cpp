@@ -10,6 +10,10 @@
 #include "kel_images.h"
 #include "kel_outside.h"
 
+#if KEL_USE_HIGHWAY
+#include <hwy/targets.h>
+#endif
+
 // The "cannot allocate" test asks malloc for 2^62 bytes; under AddressSanitizer that must come
 // back as null, as it does from the C library, instead of aborting.
 #if defined(__has_feature)
@@ -310,6 +314,72 @@ TEST(Rotation, MatchesThePlainPerPixelMapping) {
       }
     }
   }
+}
+
+// Runs `check` once for every vector variant compiled in and supported by this machine, each
+// forced in turn; once without them.
+template <typename Check>
+void for_each_variant(Check check) {
+#if KEL_USE_HIGHWAY
+  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
+    SCOPED_TRACE(hwy::TargetName(target));
+    hwy::SetSupportedTargetsForTest(target);
+    check();
+  }
+  hwy::SetSupportedTargetsForTest(0);
+#else
+  check();
+#endif
+}
+
+// Sources whose rows give runs longer than any vector and of every remainder, at every angle:
+// random pixels, and the extremes in a checkerboard and in stripes, where the bilinear totals
+// are largest and, for signed pixels, land on both sides of zero.
+TEST(Rotation, VectorVariantsMatchThePlainPerPixelMapping) {
+  std::mt19937 rng(99);
+  const int64_t sizes[][2] = {{40, 70}, {70, 40}, {2, 97}, {97, 2}, {33, 33}, {5, 131}};
+  for_each_variant([&] {
+    for (Kind kind : kKinds) {
+      const int low = kind == Kind::kUnsigned ? 0 : -128,
+                high = kind == Kind::kUnsigned ? 255 : 127;
+      for (const auto &size : sizes) {
+        const int64_t h = size[0], w = size[1];
+        std::vector<std::vector<int>> sources = {random_source(kind, h * w, rng)};
+        std::vector<int> checkerboard, stripes;
+        for (int64_t i = 0; i < h * w; ++i) {
+          checkerboard.push_back((i / w + i % w) % 2 ? high : low);
+          stripes.push_back((i % w) % 3 == 0 ? low : high);
+        }
+        sources.push_back(checkerboard);
+        sources.push_back(stripes);
+        for (const std::vector<int> &src : sources) {
+          for (int a = 0; a < 256; ++a) {
+            const uint8_t angle = static_cast<uint8_t>(a);
+            ASSERT_EQ(run(kind, src, h, w, angle), reference(kind, src, h, w, angle))
+                << "kind " << static_cast<int>(kind) << " " << h << "x" << w << " angle " << a;
+          }
+        }
+      }
+    }
+  });
+}
+
+// The vector variants take sides below 2^16; at 65535 they still run, above they leave the run
+// to the 64-bit loop.
+TEST(Rotation, LongSidesAtTheVectorLimit) {
+  std::mt19937 rng(3);
+  for_each_variant([&] {
+    for (Kind kind : kKinds) {
+      for (const int64_t side : {int64_t{65535}, int64_t{65536}}) {
+        const std::vector<int> src = random_source(kind, 3 * side, rng);
+        for (int a : {0, 64, 128, 192}) {
+          const uint8_t angle = static_cast<uint8_t>(a);
+          EXPECT_EQ(run(kind, src, 3, side, angle), reference(kind, src, 3, side, angle));
+          EXPECT_EQ(run(kind, src, side, 3, angle), reference(kind, src, side, 3, angle));
+        }
+      }
+    }
+  });
 }
 
 TEST(Rotation, SidesBeyondThe32BitRangeGiveTheTrueRotation) {

@@ -1,0 +1,221 @@
+// Vector variants of the rotations' inner loop: one run of canvas pixels along a row, every one
+// of which maps inside the source. Compiled once per instruction set and picked at run time; the
+// plain loop in rotation.cpp is the reference they are tested against, bit for bit.
+//
+// Lanes are 32-bit. The caller takes this path only for sources below 2^16 on each side and
+// below 2^31 pixels, so every position inside the source (below 2^16 * 16384 = 2^30), every
+// step between them and every byte offset fits a lane exactly.
+#undef HWY_TARGET_INCLUDE
+#define HWY_TARGET_INCLUDE "simd/rotation_simd.cpp"
+#include "simd/rotation_simd.h"
+
+#include <hwy/foreach_target.h>  // must come before highway.h
+#include <hwy/highway.h>
+
+HWY_BEFORE_NAMESPACE();
+namespace kel {
+namespace simd {
+namespace HWY_NAMESPACE {
+namespace hn = hwy::HWY_NAMESPACE;
+
+using D32 = hn::ScalableTag<int32_t>;
+using V32 = hn::Vec<D32>;
+
+constexpr int32_t kFractionMask = 16383;
+
+// Source positions of a vector of consecutive canvas pixels, 14 fraction bits.
+struct Positions {
+  V32 x, y;
+};
+
+Positions first_positions(D32 d, const RotationRow &row) {
+  const V32 lane = hn::Iota(d, 0);
+  return {hn::Add(hn::Set(d, row.x), hn::Mul(lane, hn::Set(d, row.step_x))),
+          hn::Add(hn::Set(d, row.y), hn::Mul(lane, hn::Set(d, row.step_y)))};
+}
+
+// The byte offset of each lane's whole-pixel position (x0, y0).
+V32 pixel_offsets(D32 d, const Positions &p, int32_t width) {
+  return hn::Add(hn::Mul(hn::ShiftRight<14>(p.y), hn::Set(d, width)), hn::ShiftRight<14>(p.x));
+}
+
+// For each lane, low(pairs) * low(weights) + high(pairs) * high(weights), the halves read as
+// signed 16-bit values: the pairwise multiply-add of the instruction sets. Exact, since both sums
+// used here stay below 2^31 in magnitude.
+V32 pair_dot(D32 d, V32 pairs, V32 weights) {
+#if HWY_TARGET == HWY_SCALAR
+  // One lane has no 16-bit halves to reinterpret; take them apart instead.
+  (void)d;
+  const auto low = [](V32 v) { return hn::ShiftRight<16>(hn::ShiftLeft<16>(v)); };
+  return hn::Add(hn::Mul(low(pairs), low(weights)),
+                 hn::Mul(hn::ShiftRight<16>(pairs), hn::ShiftRight<16>(weights)));
+#else
+  const hn::Repartition<int16_t, D32> d16;
+  V32 odd = hn::Zero(d);
+  const V32 even = hn::ReorderWidenMulAccumulate(d, hn::BitCast(d16, pairs),
+                                                 hn::BitCast(d16, weights), hn::Zero(d), odd);
+  return hn::RearrangeToOddPlusEven(even, odd);
+#endif
+}
+
+// The weights (16384 - f, f) of a fraction f as a pair of 16-bit halves.
+V32 weight_pair(D32 d, V32 fraction) {
+  return hn::Or(hn::Sub(hn::Set(d, 16384), fraction), hn::ShiftLeft<16>(fraction));
+}
+
+// The four neighbours of each lane as the bytes of one word, (P00, P10) from a 4-byte read at
+// the position's offset and (P01, P11) from one at offset + width - 2. Both reads stay inside
+// the source: a bilinear position has x0 + 1 < W and y0 + 1 < H, so the first read ends at
+// byte (H - 1) * W + 1 at most and the second starts at byte W - 2 or later.
+V32 neighbour_words(D32 d, const uint8_t *src, V32 offset, int32_t width) {
+  const auto *words = reinterpret_cast<const int32_t *>(src);
+  const V32 upper = hn::GatherOffset(d, words, offset);
+  const V32 lower = hn::GatherOffset(d, words, hn::Add(offset, hn::Set(d, width - 2)));
+  const V32 low_half = hn::Set(d, 0xFFFF);
+  return hn::Or(hn::And(upper, low_half), hn::AndNot(low_half, lower));
+}
+
+// The pairs (P00, P10) and (P01, P11) of each lane as its 16-bit halves, the low half the left
+// neighbour: the operands of pair_dot.
+struct NeighbourPairs {
+  V32 top, bottom;
+};
+
+template <bool kSigned>
+NeighbourPairs neighbour_pairs(D32 d, V32 words) {
+  if (kSigned) {
+    // Sign-extend each byte from the top of the lane, then keep the left one's low 16 bits.
+    const V32 low_half = hn::Set(d, 0xFFFF);
+    const V32 p00 = hn::ShiftRight<24>(hn::ShiftLeft<24>(words));
+    const V32 p10 = hn::ShiftRight<24>(hn::ShiftLeft<16>(words));
+    const V32 p01 = hn::ShiftRight<24>(hn::ShiftLeft<8>(words));
+    const V32 p11 = hn::ShiftRight<24>(words);
+    return {hn::Or(hn::And(p00, low_half), hn::ShiftLeft<16>(p10)),
+            hn::Or(hn::And(p01, low_half), hn::ShiftLeft<16>(p11))};
+  }
+  const V32 byte = hn::Set(d, 0xFF);
+  const V32 third_byte = hn::Set(d, 0xFF0000);
+  return {hn::Or(hn::And(words, byte), hn::And(hn::ShiftLeft<8>(words), third_byte)),
+          hn::Or(hn::And(hn::ShiftRight<16>(words), byte),
+                 hn::And(hn::ShiftRight<8>(words), third_byte))};
+}
+
+// The bilinear total ay * top + fy * bottom reaches 255 * 2^28, beyond a 32-bit lane; its
+// quotient by 2^28 is found without it. Split top = 2^14 * th + tl and bottom = 2^14 * bh + bl
+// (th, bh the arithmetic shifts, tl, bl in [0, 2^14)): then total = 2^14 * A + B with
+// A = ay * th + fy * bh (|A| <= 2^22) and B = ay * tl + fy * bl (0 <= B < 2^28, as ay + fy =
+// 2^14). For integers n and m >= 1, floor((n + f) / m) = floor(n / m) when 0 <= f < 1, so
+// floor(total / 2^28) = (A + (B >> 14)) >> 14, and adding 2^28 - 1 to B first gives the
+// ceiling. The pixel truncates toward zero: the floor for a total of 0 or more (a floor of 0 or
+// more), the ceiling below.
+template <bool kSigned>
+V32 bilinear_pixels(D32 d, const NeighbourPairs &pixels, V32 fx, V32 fy) {
+  const V32 across = weight_pair(d, fx);
+  const V32 top = pair_dot(d, pixels.top, across);
+  const V32 bottom = pair_dot(d, pixels.bottom, across);
+  const V32 fraction = hn::Set(d, kFractionMask);
+  const V32 whole_parts = hn::Or(hn::And(hn::ShiftRight<14>(top), hn::Set(d, 0xFFFF)),
+                                 hn::ShiftLeft<16>(hn::ShiftRight<14>(bottom)));
+  const V32 fraction_parts =
+      hn::Or(hn::And(top, fraction), hn::ShiftLeft<16>(hn::And(bottom, fraction)));
+  const V32 down = weight_pair(d, fy);
+  const V32 a = pair_dot(d, whole_parts, down);
+  const V32 b = pair_dot(d, fraction_parts, down);
+  const V32 floor = hn::ShiftRight<14>(hn::Add(a, hn::ShiftRight<14>(b)));
+  if (!kSigned) return floor;  // the total is never negative
+  const V32 b_up = hn::Add(b, hn::Set(d, (int32_t{1} << 28) - 1));
+  const V32 ceiling = hn::ShiftRight<14>(hn::Add(a, hn::ShiftRight<14>(b_up)));
+  return hn::IfThenElse(hn::Lt(floor, hn::Zero(d)), ceiling, floor);
+}
+
+template <typename Pixel>
+void store_pixels(V32 values, Pixel *out) {
+  const hn::Rebind<Pixel, D32> d8;
+  hn::StoreU(hn::DemoteTo(d8, values), d8, out);
+}
+
+template <bool kSigned, typename Pixel>
+size_t bilinear_row(const RotationRow &row, Pixel *out) {
+  const D32 d;
+  const size_t lanes = hn::Lanes(d);
+  const auto *src = static_cast<const uint8_t *>(row.src);
+  Positions p = first_positions(d, row);
+  const V32 advance_x = hn::Set(d, row.step_x * static_cast<int32_t>(lanes));
+  const V32 advance_y = hn::Set(d, row.step_y * static_cast<int32_t>(lanes));
+  const V32 fraction = hn::Set(d, kFractionMask);
+  size_t done = 0;
+  for (; done + lanes <= row.count; done += lanes) {
+    const V32 words = neighbour_words(d, src, pixel_offsets(d, p, row.width), row.width);
+    const NeighbourPairs pixels = neighbour_pairs<kSigned>(d, words);
+    const V32 values =
+        bilinear_pixels<kSigned>(d, pixels, hn::And(p.x, fraction), hn::And(p.y, fraction));
+    store_pixels(values, out + done);
+    p.x = hn::Add(p.x, advance_x);
+    p.y = hn::Add(p.y, advance_y);
+  }
+  return done;
+}
+
+size_t BilinearRowU8(const RotationRow &row, uint8_t *out) {
+  return bilinear_row<false>(row, out);
+}
+
+size_t BilinearRowI8(const RotationRow &row, int8_t *out) {
+  return bilinear_row<true>(row, out);
+}
+
+// One 4-byte read per lane holds the pixel: at its own offset where the source has three more
+// bytes after it, else ending at it (the last pixels of the source). The caller takes this path
+// only for sources of four pixels or more, so both reads stay inside.
+size_t NearestRowI8(const RotationRow &row, int8_t *out) {
+  const D32 d;
+  const size_t lanes = hn::Lanes(d);
+  const auto *words = static_cast<const int32_t *>(row.src);
+  Positions p = first_positions(d, row);
+  const V32 advance_x = hn::Set(d, row.step_x * static_cast<int32_t>(lanes));
+  const V32 advance_y = hn::Set(d, row.step_y * static_cast<int32_t>(lanes));
+  const V32 last_read = hn::Set(d, row.width * row.height - 4);
+  size_t done = 0;
+  for (; done + lanes <= row.count; done += lanes) {
+    const V32 offset = pixel_offsets(d, p, row.width);
+    const V32 read_at = hn::Min(offset, last_read);
+    const V32 word = hn::GatherOffset(d, words, read_at);
+    // The pixel is byte (offset - read_at) of the word; move it to the top and sign-extend.
+    const V32 to_top = hn::Sub(hn::Set(d, 24), hn::ShiftLeft<3>(hn::Sub(offset, read_at)));
+    const V32 value = hn::ShiftRight<24>(word << to_top);
+    // -128 marks uncovered pixels, so a covered -128 is stored as -127.
+    store_pixels(hn::Max(value, hn::Set(d, -127)), out + done);
+    p.x = hn::Add(p.x, advance_x);
+    p.y = hn::Add(p.y, advance_y);
+  }
+  return done;
+}
+
+}  // namespace HWY_NAMESPACE
+}  // namespace simd
+}  // namespace kel
+HWY_AFTER_NAMESPACE();
+
+#if HWY_ONCE
+namespace kel {
+namespace simd {
+
+HWY_EXPORT(BilinearRowU8);
+HWY_EXPORT(BilinearRowI8);
+HWY_EXPORT(NearestRowI8);
+
+size_t rotate_row_bilinear(const RotationRow &row, uint8_t *out) {
+  return HWY_DYNAMIC_DISPATCH(BilinearRowU8)(row, out);
+}
+
+size_t rotate_row_bilinear(const RotationRow &row, int8_t *out) {
+  return HWY_DYNAMIC_DISPATCH(BilinearRowI8)(row, out);
+}
+
+size_t rotate_row_nearest(const RotationRow &row, int8_t *out) {
+  return HWY_DYNAMIC_DISPATCH(NearestRowI8)(row, out);
+}
+
+}  // namespace simd
+}  // namespace kel
+#endif  // HWY_ONCE
