@@ -6,6 +6,7 @@
 
 #include "kel_images.h"
 #include "outside/kel_outside.h"
+#include "simd/pixel_ops_simd.h"
 
 namespace {
 
@@ -42,11 +43,27 @@ uint8_t darkened(uint8_t value, uint16_t percent) {
   return static_cast<uint8_t>(value - product / 100);
 }
 
-// Each output byte is written after the input byte at the same index was read, so dst may be
-// src.
-template <class Rule>
-void map_pixels(const uint8_t *src, uint32_t count, uint8_t *dst, Rule rule) {
-  for (uint32_t i = 0; i < count; ++i) dst[i] = rule(src[i]);
+// The sum of two bytes (at most 510) halved rounding down always fits a byte.
+uint8_t blended(uint8_t target, uint8_t source) {
+  return static_cast<uint8_t>((unsigned{target} + unsigned{source}) >> 1);
+}
+
+// Whether the destination range starts inside the source range, after its first byte. Only
+// then can a row operation write a source byte that it has not read yet; a destination at or
+// before the source only ever overwrites source bytes that were already read. So only then must
+// a row be done pixel by pixel; otherwise reading ahead gives the same result.
+bool starts_inside(const uint8_t *to, const uint8_t *from, size_t count) {
+  const uintptr_t to_address = reinterpret_cast<uintptr_t>(to);
+  const uintptr_t from_address = reinterpret_cast<uintptr_t>(from);
+  return to_address > from_address && to_address - from_address < count;
+}
+
+// The vector variant of a row operation where it gives the plain loop's result, else the plain
+// loop.
+template <class Row>
+Row *row_loop(Row *plain_row, Row *vector_row, const uint8_t *to, const uint8_t *from,
+              size_t count) {
+  return starts_inside(to, from, count) ? plain_row : vector_row;
 }
 
 // ---------------------------------------------------------------------------------------------
@@ -72,22 +89,15 @@ VisibleRect visible_rect(int32_t dst_height, int32_t dst_width, uint16_t src_hei
   return rect;
 }
 
-// Whether the destination range starts inside the source range, after its first byte. Only
-// then can a row operation write a source byte that it has not read yet; a destination at or
-// before the source only ever overwrites source bytes that were already read.
-bool starts_inside(const uint8_t *to, const uint8_t *from, size_t count) {
-  const uintptr_t to_address = reinterpret_cast<uintptr_t>(to);
-  const uintptr_t from_address = reinterpret_cast<uintptr_t>(from);
-  return to_address > from_address && to_address - from_address < count;
-}
-
 // Copies count bytes with the result of d[i] = s[i] for i = 0, 1, ... in turn, also when the
-// ranges overlap. memmove equals that forward copy unless the destination starts inside the
-// source; then the forward copy repeats the first (to - from) source bytes, which copying in
-// blocks of that length reproduces, each block's source being the previous, finished block.
-void copy_forward(uint8_t *to, const uint8_t *from, size_t count) {
+// ranges overlap. A forward copy that reads ahead (memmove, or the vector loop) equals it unless
+// the destination starts inside the source; then the forward copy repeats the first
+// (to - from) source bytes, which copying in blocks of that length reproduces, each block's
+// source being the previous, finished block.
+void copy_forward(const kel::CompositeRowLoops &loops, uint8_t *to, const uint8_t *from,
+                  size_t count) {
   if (!starts_inside(to, from, count)) {
-    std::memmove(to, from, count);
+    loops.copy(from, count, to);
     return;
   }
   const size_t period = static_cast<size_t>(to - from);
@@ -97,56 +107,49 @@ void copy_forward(uint8_t *to, const uint8_t *from, size_t count) {
   }
 }
 
-// Applies a pixel rule to a row in increasing column order, reading each source pixel just
-// before its destination pixel is written.
+// The keyed row. Looking ahead at the source before writing is safe unless the destination
+// starts inside the source; that row takes the pixel loop as a whole. Otherwise the vector
+// variant does it, or, without one, pieces that hold no key go as opaque rows.
 template <class Rule>
-void mix_row(uint8_t *to, const uint8_t *from, size_t count) {
-  for (size_t i = 0; i < count; ++i) to[i] = Rule::mix(to[i], from[i]);
-}
-
-template <class Rule>
-void mix_row_with_key(uint8_t *to, const uint8_t *from, size_t count, uint8_t transparent) {
-  for (size_t i = 0; i < count; ++i) {
-    const uint8_t value = from[i];
-    if (value != transparent) to[i] = Rule::mix(to[i], value);
-  }
-}
-
-// Pixels looked at together by the keyed row: a piece without the key is done as an opaque row.
-constexpr size_t kKeyPiece = 64;
-
-// The keyed row in pieces. Looking ahead at a piece's source before writing it is safe unless
-// the destination starts inside the source; that row takes the pixel loop as a whole.
-template <class Rule>
-void keyed_row(uint8_t *to, const uint8_t *from, size_t count, uint8_t transparent) {
+void keyed_row(const kel::CompositeRowLoops &loops, uint8_t *to, const uint8_t *from, size_t count,
+               uint8_t transparent) {
   if (starts_inside(to, from, count)) {
-    mix_row_with_key<Rule>(to, from, count, transparent);
+    Rule::keyed_loop(kel::plain::composite_row_loops())(from, count, transparent, to);
     return;
   }
+#if KEL_USE_HIGHWAY
+  Rule::keyed_loop(loops)(from, count, transparent, to);
+#else
+  // Pixels looked at together: a piece without the key is done as an opaque row.
+  constexpr size_t kKeyPiece = 64;
   for (size_t start = 0; start < count; start += kKeyPiece) {
     const size_t piece = count - start < kKeyPiece ? count - start : kKeyPiece;
     if (holds(from + start, piece, transparent)) {
-      mix_row_with_key<Rule>(to + start, from + start, piece, transparent);
+      Rule::keyed_loop(loops)(from + start, piece, transparent, to + start);
     } else {
-      Rule::opaque_row(to + start, from + start, piece);
+      Rule::opaque_row(loops, to + start, from + start, piece);
     }
   }
+#endif
 }
 
 struct Paste {
-  static uint8_t mix(uint8_t, uint8_t source) { return source; }
-  static void opaque_row(uint8_t *to, const uint8_t *from, size_t count) {
-    copy_forward(to, from, count);
+  static void opaque_row(const kel::CompositeRowLoops &loops, uint8_t *to, const uint8_t *from,
+                         size_t count) {
+    copy_forward(loops, to, from, count);
+  }
+  static kel::KeyedRowLoop keyed_loop(const kel::CompositeRowLoops &loops) {
+    return loops.paste_with_key;
   }
 };
 
 struct Blend {
-  // The sum of two bytes (at most 510) halved rounding down always fits a byte.
-  static uint8_t mix(uint8_t target, uint8_t source) {
-    return static_cast<uint8_t>((unsigned{target} + unsigned{source}) >> 1);
+  static void opaque_row(const kel::CompositeRowLoops &loops, uint8_t *to, const uint8_t *from,
+                         size_t count) {
+    row_loop(kel::plain::blend_row, loops.blend, to, from, count)(from, count, to);
   }
-  static void opaque_row(uint8_t *to, const uint8_t *from, size_t count) {
-    mix_row<Blend>(to, from, count);
+  static kel::KeyedRowLoop keyed_loop(const kel::CompositeRowLoops &loops) {
+    return loops.blend_with_key;
   }
 };
 
@@ -156,15 +159,16 @@ void composite(uint8_t *dst, int32_t dst_height, int32_t dst_width, const uint8_
                uint16_t src_height, uint16_t src_width, int32_t x, int32_t y, uint16_t key) {
   const VisibleRect rect = visible_rect(dst_height, dst_width, src_height, src_width, x, y);
   if (rect.empty()) return;
+  const kel::CompositeRowLoops loops = kel::simd::composite_row_loops();
   const size_t count = static_cast<size_t>(rect.last_col - rect.first_col + 1);
   for (int64_t row = rect.first_row; row <= rect.last_row; ++row) {
     // Both offsets lie inside their rasters, which the caller sized, so they fit ptrdiff_t.
     const uint8_t *from = src + static_cast<ptrdiff_t>(row * src_width + rect.first_col);
     uint8_t *to = dst + static_cast<ptrdiff_t>((y + row) * dst_width + x + rect.first_col);
     if (key > 255) {
-      Rule::opaque_row(to, from, count);
+      Rule::opaque_row(loops, to, from, count);
     } else {
-      keyed_row<Rule>(to, from, count, static_cast<uint8_t>(key));
+      keyed_row<Rule>(loops, to, from, count, static_cast<uint8_t>(key));
     }
   }
 }
@@ -384,20 +388,60 @@ void fill_masked(const uint8_t *src, uint16_t height, uint16_t width, const uint
 
 }  // namespace
 
+namespace kel {
+namespace plain {
+
+// Each output byte is written after the input byte at the same index was read, so the rows
+// work in place.
+void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  for (size_t i = 0; i < count; ++i) out[i] = brightened(in[i], percent);
+}
+
+void darken_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  for (size_t i = 0; i < count; ++i) out[i] = darkened(in[i], percent);
+}
+
+// Each source pixel is read just before its destination pixel is written.
+// memmove reads ahead, which the callers allow.
+void copy_row(const uint8_t *in, size_t count, uint8_t *out) {
+  if (count != 0) std::memmove(out, in, count);
+}
+
+void blend_row(const uint8_t *in, size_t count, uint8_t *out) {
+  for (size_t i = 0; i < count; ++i) out[i] = blended(out[i], in[i]);
+}
+
+void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  for (size_t i = 0; i < count; ++i) {
+    const uint8_t value = in[i];
+    if (value != key) out[i] = value;
+  }
+}
+
+void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  for (size_t i = 0; i < count; ++i) {
+    const uint8_t value = in[i];
+    if (value != key) out[i] = blended(out[i], value);
+  }
+}
+
+}  // namespace plain
+}  // namespace kel
+
 extern "C" {
 
 void kel_image_brighten(const uint8_t *src, uint32_t height, uint32_t width, uint32_t percent,
                         uint8_t *dst) {
-  const uint16_t p = clamp_percent(percent);
-  map_pixels(src, pixel_count(height, width), dst,
-             [p](uint8_t value) { return brightened(value, p); });
+  const uint32_t count = pixel_count(height, width);
+  row_loop(kel::plain::brighten_row, kel::simd::brighten_row, dst, src, count)(
+      src, count, clamp_percent(percent), dst);
 }
 
 void kel_image_darken(const uint8_t *src, uint32_t height, uint32_t width, uint32_t percent,
                       uint8_t *dst) {
-  const uint16_t p = clamp_percent(percent);
-  map_pixels(src, pixel_count(height, width), dst,
-             [p](uint8_t value) { return darkened(value, p); });
+  const uint32_t count = pixel_count(height, width);
+  row_loop(kel::plain::darken_row, kel::simd::darken_row, dst, src, count)(
+      src, count, clamp_percent(percent), dst);
 }
 
 void kel_get_mask(const uint8_t *src, uint32_t height, uint32_t width, int32_t key, uint8_t *mask) {

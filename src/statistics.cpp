@@ -6,6 +6,46 @@
 
 #include "kel_images.h"
 #include "outside/kel_outside.h"
+#include "simd/statistics_simd.h"
+
+namespace kel {
+namespace plain {
+
+// A run of one value would make every increment wait for the store of the one before, so
+// consecutive pixels go to four histograms in turn -- the caller's and three on the stack (3 KiB
+// at most) -- that are summed at the end. Written out by hand, as compilers do not unroll the
+// lanes at -O2.
+void count_top_bits(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *hist) {
+  const uint32_t shift = 8 - bits;
+  const uint32_t bins = uint32_t{1} << bits;
+  uint32_t lane1[256], lane2[256], lane3[256];
+  for (uint32_t bin = 0; bin < bins; ++bin) hist[bin] = lane1[bin] = lane2[bin] = lane3[bin] = 0;
+
+  uint32_t i = 0;
+  for (; count - i >= 4; i += 4) {
+    ++hist[pixels[i] >> shift];
+    ++lane1[pixels[i + 1] >> shift];
+    ++lane2[pixels[i + 2] >> shift];
+    ++lane3[pixels[i + 3] >> shift];
+  }
+  for (; i < count; ++i) ++hist[pixels[i] >> shift];
+
+  // No bin can overflow: count is below 2^31.
+  for (uint32_t bin = 0; bin < bins; ++bin) hist[bin] += lane1[bin] + lane2[bin] + lane3[bin];
+}
+
+PixelSums pixel_sums(const uint8_t *pixels, uint32_t count) {
+  PixelSums sums{0, 0};
+  for (uint32_t i = 0; i < count; ++i) {
+    const uint32_t value = pixels[i];
+    sums.sum += value;
+    sums.sum_of_squares += value * value;
+  }
+  return sums;
+}
+
+}  // namespace plain
+}  // namespace kel
 
 namespace {
 
@@ -24,27 +64,23 @@ uint32_t pixels_to_visit(uint32_t area) {
   return area <= uint32_t{INT32_MAX} ? area : 0;
 }
 
-// Clears hist[0 .. 2^bits) and counts the top `bits` bits of src[0 .. n) into it. A run of one
-// value would make every increment wait for the store of the one before, so consecutive pixels
-// go to four histograms in turn -- the caller's and three on the stack (3 KiB at most) -- that
-// are summed at the end. Written out by hand, as compilers do not unroll the lanes at -O2.
+// Counts with the vector variant where there is one for this many bins.
 void count_pixels(const uint8_t *src, uint32_t n, uint32_t bits, uint32_t *hist) {
-  const uint32_t shift = kFullBits - bits;
-  const uint32_t bins = uint32_t{1} << bits;
-  uint32_t lane1[kFullBins], lane2[kFullBins], lane3[kFullBins];
-  for (uint32_t bin = 0; bin < bins; ++bin) hist[bin] = lane1[bin] = lane2[bin] = lane3[bin] = 0;
-
-  uint32_t i = 0;
-  for (; n - i >= 4; i += 4) {
-    ++hist[src[i] >> shift];
-    ++lane1[src[i + 1] >> shift];
-    ++lane2[src[i + 2] >> shift];
-    ++lane3[src[i + 3] >> shift];
+#if KEL_USE_HIGHWAY
+  if (bits <= kel::kMostVectorBinBits) {
+    kel::simd::count_top_bits(src, n, bits, hist);
+    return;
   }
-  for (; i < n; ++i) ++hist[src[i] >> shift];
+#endif
+  kel::plain::count_top_bits(src, n, bits, hist);
+}
 
-  // No bin can overflow: n is below 2^31.
-  for (uint32_t bin = 0; bin < bins; ++bin) hist[bin] += lane1[bin] + lane2[bin] + lane3[bin];
+kel::PixelSums sum_pixels(const uint8_t *src, uint32_t n) {
+#if KEL_USE_HIGHWAY
+  return kel::simd::pixel_sums(src, n);
+#else
+  return kel::plain::pixel_sums(src, n);
+#endif
 }
 
 // floor(sqrt(variance)). tq_sqrt_24_5 reads v << 18 as v / 64 and returns its root with five
@@ -92,13 +128,20 @@ uint8_t kel_hist_std(const uint32_t *hist, uint8_t mean, uint32_t count) {
   return std_from_var(kel_hist_var(hist, mean, count));
 }
 
+// The histogram's statistics, taken straight from the pixels in one pass. With S = sum of p
+// and Q = sum of p^2 (both modulo 2^32, as the histogram's sums wrap), the mean is S / count and
+// the variance sum is sum of (p - m)^2 = Q - 2mS + n m^2 over the n pixels counted: an identity
+// of integers, so it holds modulo 2^32 as well, wrapped products included.
 uint16_t kel_image_var(const uint8_t *src, int32_t height, int32_t width, uint8_t *mean_out) {
-  uint32_t hist[kFullBins];
-  kel_image_histogram(src, height, width, hist);
   const uint32_t count = image_area(height, width);
-  const uint8_t mean = kel_hist_mean(hist, count);
+  const uint32_t visited = pixels_to_visit(count);
+  const kel::PixelSums sums = sum_pixels(src, visited);
+  const auto mean = static_cast<uint8_t>(count != 0 ? sums.sum / count : 0);
   if (mean_out != nullptr) *mean_out = mean;
-  return kel_hist_var(hist, mean, count);
+  if (count == 0) return 0;
+  const uint32_t m = mean;
+  const uint32_t deviations = sums.sum_of_squares - 2 * m * sums.sum + visited * (m * m);
+  return static_cast<uint16_t>(deviations / count);
 }
 
 uint8_t kel_image_std(const uint8_t *src, int32_t height, int32_t width, uint8_t *mean_out) {

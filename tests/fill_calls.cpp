@@ -11,6 +11,7 @@
 
 #include "kel_images.h"
 #include "kel_outside.h"
+#include "test_support.h"
 
 namespace {
 
@@ -70,45 +71,36 @@ uint32_t tq_sqrt_24_5(uint32_t) {
 
 namespace {
 
+using kel_test::Guarded;
+
 struct Picture {
   uint16_t height, width;
   Bytes src, mask;
-  bool hole(int x, int y) const { return mask[static_cast<size_t>(y) * width + x] == 0; }
-  bool interior(int x, int y) const {
-    return x >= 1 && y >= 1 && x + 2 <= width && y + 2 <= height;
-  }
-  bool next_to(int x, int y, bool want_hole) const {
-    for (int dy = -1; dy <= 1; ++dy) {
-      for (int dx = -1; dx <= 1; ++dx) {
-        const int nx = x + dx, ny = y + dy;
-        if ((dx || dy) && nx >= 0 && ny >= 0 && nx < width && ny < height &&
-            hole(nx, ny) == want_hole) {
-          return true;
-        }
-      }
-    }
-    return false;
-  }
+  kel_test::Mask classes() const { return {height, width, mask.data()}; }
   uint16_t grid_height() const { return static_cast<uint16_t>((height + 7) / 8); }
   uint16_t grid_width() const { return static_cast<uint16_t>((width + 7) / 8); }
 };
 
-// Runs the fill and returns the calls it made.
-std::vector<Call> run(const Picture &p, Bytes &dst) {
+// Runs the fill into a separate, guarded destination and returns the grid that its first call,
+// the grid's blur, received.
+Bytes grid_reaching_blur(const Picture &p) {
+  Guarded dst(p.src.size(), 0xEE);
   g_calls.clear();
   kel_mask_image(p.src.data(), p.height, p.width, p.mask.data(), dst.data());
-  return g_calls;
+  EXPECT_TRUE(dst.guards_intact());
+  if (g_calls.size() != 3) ADD_FAILURE() << g_calls.size() << " calls";
+  return g_calls.empty() ? Bytes() : g_calls[0].input;
 }
 
-// Per cell, the largest source value among the border pixels (interior known pixels next to
-// the hole), then every empty cell takes the largest value among the filled cells nearest to it
-// (Chebyshev distance): that is what passes of one ring each produce.
+// Per cell, the largest source value among the border pixels, then every empty cell takes the
+// largest value among the filled cells nearest to it (Chebyshev distance): that is what passes
+// of one ring each produce.
 Bytes expected_grid(const Picture &p) {
   const int grid_height = p.grid_height(), grid_width = p.grid_width();
   Bytes gathered(static_cast<size_t>(grid_height) * grid_width, 0);
   for (int y = 0; y < p.height; ++y) {
     for (int x = 0; x < p.width; ++x) {
-      if (!p.hole(x, y) && p.interior(x, y) && p.next_to(x, y, true)) {
+      if (p.classes().border(x, y)) {
         uint8_t &cell = gathered[static_cast<size_t>(y / 8) * grid_width + x / 8];
         cell = std::max(cell, p.src[static_cast<size_t>(y) * p.width + x]);
       }
@@ -134,14 +126,18 @@ Bytes expected_grid(const Picture &p) {
   return grid;
 }
 
+// A fifth of the pixels holes, the rest known with any nonzero mask value.
 Picture random_picture(uint16_t height, uint16_t width, uint32_t seed) {
-  std::mt19937 generator(seed);
-  std::uniform_int_distribution<int> value(0, 255), hole(0, 4);
-  Picture p{height, width, Bytes(size_t{height} * width), Bytes(size_t{height} * width)};
-  for (uint8_t &v : p.src) v = static_cast<uint8_t>(value(generator));
-  for (uint8_t &m : p.mask)
-    m = static_cast<uint8_t>(hole(generator) == 0 ? 0 : 1 + value(generator) % 255);
+  const size_t count = size_t{height} * width;
+  Picture p{height, width, kel_test::random_bytes(count, seed),
+            kel_test::random_bytes(count, seed + 1000, 0, 4)};
+  const Bytes known = kel_test::random_bytes(count, seed + 2000, 1, 255);
+  for (size_t i = 0; i < count; ++i) p.mask[i] = p.mask[i] == 0 ? 0 : known[i];
   return p;
+}
+
+Picture blank_picture(uint16_t height, uint16_t width) {
+  return Picture{height, width, Bytes(size_t{height} * width, 0), Bytes(size_t{height} * width, 1)};
 }
 
 // One hole pixel at (x, y) whose eight neighbours, its only border pixels, hold `value`.
@@ -154,86 +150,55 @@ void seed_cell(Picture &p, int x, int y, uint8_t value) {
   }
 }
 
-Picture blank_picture(uint16_t height, uint16_t width) {
-  return Picture{height, width, Bytes(size_t{height} * width, 0), Bytes(size_t{height} * width, 1)};
-}
-
+// The three calls and what is done with their results, in place and into a separate
+// destination: the gathered and dilated grid is smoothed in place, enlarged by 8 into its own
+// raster; holes take the enlarged raster, the filled image is blurred into a third raster, and
+// the interior seam takes that. Sizes without interior pixels gather nothing and soften nothing;
+// zero sizes still make all three calls and write nothing.
 TEST(FillCalls, ArgumentsOrderAndWhatIsDoneWithTheResults) {
-  for (bool in_place : {false, true}) {
-    SCOPED_TRACE(in_place ? "in place" : "separate destination");
-    const Picture p = random_picture(20, 27, 1);
-    Bytes dst = in_place ? p.src : Bytes(p.src.size(), 0xEE);
-    g_calls.clear();
-    const uint8_t *source = in_place ? dst.data() : p.src.data();
-    kel_mask_image(source, p.height, p.width, p.mask.data(), dst.data());
-    const std::vector<Call> calls = g_calls;
-    ASSERT_EQ(calls.size(), 3u);
-
-    const Call &grid_blur = calls[0], &enlarge = calls[1], &image_blur = calls[2];
-    EXPECT_TRUE(grid_blur.is_blur);
-    EXPECT_EQ(grid_blur.in, grid_blur.out);  // the grid is smoothed in place
-    EXPECT_EQ(grid_blur.in_height, 3);
-    EXPECT_EQ(grid_blur.in_width, 4);
-    EXPECT_EQ(grid_blur.input, expected_grid(p));
-
-    EXPECT_FALSE(enlarge.is_blur);
-    EXPECT_EQ(enlarge.in, grid_blur.out);
-    EXPECT_EQ(enlarge.in_height, 3);
-    EXPECT_EQ(enlarge.in_width, 4);
-    EXPECT_EQ(enlarge.factor, 8);
-    EXPECT_EQ(enlarge.out_height, 24);
-    EXPECT_EQ(enlarge.out_width, 32);
-    Bytes smoothed = grid_blur.input;
-    for (uint8_t &v : smoothed) v = blur_result(v);
-    EXPECT_EQ(enlarge.input, smoothed);
-
-    EXPECT_TRUE(image_blur.is_blur);
-    EXPECT_EQ(image_blur.in, dst.data());
-    EXPECT_EQ(image_blur.in_height, 20);
-    EXPECT_EQ(image_blur.in_width, 27);
-    EXPECT_NE(image_blur.out, dst.data());
-    EXPECT_NE(image_blur.out, enlarge.out);
-    EXPECT_NE(image_blur.out, grid_blur.out);
-    EXPECT_NE(enlarge.out, grid_blur.out);
-
-    // Holes take the enlarged raster (row stride 32); the interior seam then the blurred image.
-    for (int y = 0; y < p.height; ++y) {
-      for (int x = 0; x < p.width; ++x) {
-        SCOPED_TRACE(testing::Message() << "(" << x << ", " << y << ")");
-        const size_t i = static_cast<size_t>(y) * p.width + x;
+  const uint16_t kSizes[][2] = {{20, 27}, {2, 7}, {9, 2}, {1, 1},
+                                {0, 5},   {5, 0}, {0, 0}, {0, 65528}};
+  for (const auto &size : kSizes) {
+    for (bool in_place : {false, true}) {
+      SCOPED_TRACE(testing::Message()
+                   << size[0] << " x " << size[1] << (in_place ? " in place" : ""));
+      const Picture p = random_picture(size[0], size[1], size[0] + 1u);
+      const kel_test::Mask mask = p.classes();
+      Guarded src(p.src.size(), 0), dst(p.src.size(), 0xEE);
+      std::copy(p.src.begin(), p.src.end(), src.data());
+      if (in_place) std::copy(p.src.begin(), p.src.end(), dst.data());
+      g_calls.clear();
+      kel_mask_image(in_place ? dst.data() : src.data(), p.height, p.width, p.mask.data(),
+                     dst.data());
+      EXPECT_TRUE(dst.guards_intact());
+      ASSERT_EQ(g_calls.size(), 3u);
+      const Call &grid_blur = g_calls[0], &enlarge = g_calls[1], &image_blur = g_calls[2];
+      const uint16_t grid_height = p.grid_height(), grid_width = p.grid_width();
+      EXPECT_TRUE(grid_blur.is_blur && !enlarge.is_blur && image_blur.is_blur);
+      EXPECT_EQ(grid_blur.in, grid_blur.out);
+      EXPECT_EQ(enlarge.in, grid_blur.out);
+      EXPECT_EQ(image_blur.in, dst.data());
+      const std::vector<uint16_t> sizes = {
+          grid_blur.in_height, grid_blur.in_width,   enlarge.in_height,
+          enlarge.in_width,    enlarge.factor,       enlarge.out_height,
+          enlarge.out_width,   image_blur.in_height, image_blur.in_width};
+      EXPECT_EQ(sizes, (std::vector<uint16_t>{grid_height, grid_width, grid_height, grid_width, 8,
+                                              uint16_t(grid_height * 8), uint16_t(grid_width * 8),
+                                              p.height, p.width}));
+      for (const uint8_t *out : {enlarge.out, grid_blur.out}) EXPECT_NE(image_blur.out, out);
+      EXPECT_NE(enlarge.out, grid_blur.out);
+      EXPECT_EQ(grid_blur.input, expected_grid(p));
+      Bytes smoothed = grid_blur.input;
+      for (uint8_t &v : smoothed) v = blur_result(v);
+      EXPECT_EQ(enlarge.input, smoothed);
+      for (int i = 0; i < int(p.src.size()); ++i) {
+        const int x = i % p.width, y = i / p.width;
         const uint8_t filled =
-            p.hole(x, y) ? enlarged_at(static_cast<size_t>(y) * 32 + x) : p.src[i];
-        ASSERT_EQ(image_blur.input[i], filled);
-        const bool seam = p.hole(x, y) && p.interior(x, y) && p.next_to(x, y, false);
-        ASSERT_EQ(dst[i], seam ? blur_result(filled) : filled);
+            mask.hole(x, y) ? enlarged_at(size_t(y) * enlarge.out_width + x) : p.src[i];
+        ASSERT_EQ(image_blur.input[i], filled) << x << ", " << y;
+        ASSERT_EQ(dst.data()[i], mask.seam(x, y) ? blur_result(filled) : filled) << x << ", " << y;
       }
     }
-  }
-}
-
-TEST(FillCalls, ZeroSizesStillCallBothSiblings) {
-  struct SizeCase {
-    uint16_t height, width, grid_height, grid_width;
-  };
-  const SizeCase kSizes[] = {{0, 5, 0, 1}, {5, 0, 1, 0}, {0, 0, 0, 0}, {0, 65528, 0, 8191}};
-  const Bytes src(4, 9), mask(4, 0);
-  for (const SizeCase &c : kSizes) {
-    SCOPED_TRACE(testing::Message() << c.height << " x " << c.width);
-    Bytes dst(4, 0xEE);
-    g_calls.clear();
-    kel_mask_image(src.data(), c.height, c.width, mask.data(), dst.data());
-    EXPECT_EQ(dst, Bytes(4, 0xEE));
-    ASSERT_EQ(g_calls.size(), 3u);
-    EXPECT_EQ(g_calls[0].in, g_calls[0].out);
-    EXPECT_EQ(g_calls[0].in_height, c.grid_height);
-    EXPECT_EQ(g_calls[0].in_width, c.grid_width);
-    EXPECT_EQ(g_calls[1].in_height, c.grid_height);
-    EXPECT_EQ(g_calls[1].in_width, c.grid_width);
-    EXPECT_EQ(g_calls[1].out_height, c.grid_height * 8);
-    EXPECT_EQ(g_calls[1].out_width, c.grid_width * 8);
-    EXPECT_EQ(g_calls[2].in, dst.data());
-    EXPECT_EQ(g_calls[2].in_height, c.height);
-    EXPECT_EQ(g_calls[2].in_width, c.width);
   }
 }
 
@@ -254,13 +219,12 @@ TEST(FillCalls, GridIsGatheredAndDilated) {
     int x, y;
     uint8_t value;
   };
-  struct GridCase {
+  const struct {
     const char *what;
     uint16_t height, width;
     std::vector<Seed> seeds;
     Bytes grid;  // empty: the grid is checked against expected_grid only
-  };
-  const GridCase kCases[] = {
+  } kCases[] = {
       {"one cell at a corner fills the whole grid", 40, 56, {{3, 3, 90}}, Bytes(35, 90)},
       {"one cell in the middle", 40, 56, {{27, 19, 90}}, Bytes(35, 90)},
       {"one cell at the far corner", 40, 56, {{52, 36, 90}}, Bytes(35, 90)},
@@ -280,45 +244,29 @@ TEST(FillCalls, GridIsGatheredAndDilated) {
        {}},
       {"a tall grid", 2100, 24, {{12, 3, 90}, {3, 1000, 30}, {20, 2090, 140}}, {}},
   };
-  for (const GridCase &c : kCases) {
+  for (const auto &c : kCases) {
     SCOPED_TRACE(c.what);
     Picture p = blank_picture(c.height, c.width);
     for (const Seed &s : c.seeds) seed_cell(p, s.x, s.y, s.value);
-    Bytes dst(p.src.size());
-    const std::vector<Call> calls = run(p, dst);
-    ASSERT_EQ(calls.size(), 3u);
+    const Bytes grid = grid_reaching_blur(p);
     if (!c.grid.empty()) {
-      EXPECT_EQ(calls[0].input, c.grid);
+      EXPECT_EQ(grid, c.grid);
     }
-    EXPECT_EQ(calls[0].input, expected_grid(p));
+    EXPECT_EQ(grid, expected_grid(p));
   }
-}
-
-// A hole right beside an edge of the column pieces in which the edge walker looks for holes,
-// its only higher border pixels on the other side of that edge.
-TEST(FillCalls, BorderPixelsBesideAHoleAcrossAPieceEdge) {
+  // A hole right beside an edge of the column pieces in which the edge walker looks for holes,
+  // its only higher border pixels on the other side of that edge.
   for (int x : {64, 65, 128, 129, 192, 193}) {
-    SCOPED_TRACE(x);
     Picture p = blank_picture(16, 200);
     std::fill(p.src.begin(), p.src.end(), 10);
     p.mask[size_t{8} * p.width + x] = 0;
-    const int border_x = x % 2 == 0 ? x + 1 : x - 1;
-    for (int y = 7; y <= 9; ++y) p.src[static_cast<size_t>(y) * p.width + border_x] = 77;
-    Bytes dst(p.src.size());
-    const std::vector<Call> calls = run(p, dst);
-    ASSERT_EQ(calls.size(), 3u);
-    EXPECT_EQ(calls[0].input, expected_grid(p));
+    for (int y = 7; y <= 9; ++y)
+      p.src[static_cast<size_t>(y) * p.width + (x % 2 ? x - 1 : x + 1)] = 77;
+    EXPECT_EQ(grid_reaching_blur(p), expected_grid(p)) << "piece edge at " << x;
   }
-}
-
-TEST(FillCalls, RandomPicturesGatherTheLargestBorderValue) {
   for (uint32_t seed = 0; seed < 8; ++seed) {
-    const Picture p = random_picture(static_cast<uint16_t>(17 + seed * 5),
-                                     static_cast<uint16_t>(40 - seed * 3), seed);
-    Bytes dst(p.src.size());
-    const std::vector<Call> calls = run(p, dst);
-    ASSERT_EQ(calls.size(), 3u);
-    EXPECT_EQ(calls[0].input, expected_grid(p)) << seed;
+    const Picture p = random_picture(uint16_t(17 + seed * 5), uint16_t(40 - seed * 3), seed);
+    EXPECT_EQ(grid_reaching_blur(p), expected_grid(p)) << "random " << seed;
   }
 }
 

@@ -48,7 +48,7 @@ TEST(ImageCreate, AcceptsExactlyTheRepresentableSizes) {
   }
 }
 
-TEST(ImageCreate, PacksRowsWithoutGaps) {
+TEST(ImageCreate, PacksRowsWithoutGapsAndDeleteAcceptsNull) {
   kel_image *image = kel_image_create(7, 9, 2);
   ASSERT_NE(image, nullptr);
   EXPECT_EQ(image->stride, 18);
@@ -56,43 +56,29 @@ TEST(ImageCreate, PacksRowsWithoutGaps) {
   kel_image_delete(image);
   EXPECT_EQ(kel_image_create(1, 65536, 65536), nullptr);
   EXPECT_EQ(kel_image_create(1, -3, 2), nullptr);
-}
-
-TEST(ImageCreate, DeleteAcceptsNull) {
   kel_image_delete(nullptr);
 }
 
-TEST(ImageAddressing, OffsetAndPointerFollowStrideAndPixelSize) {
-  kel_image *image = kel_image_create_ex(4, 5, 3, 16);
-  ASSERT_NE(image, nullptr);
-  EXPECT_EQ(kel_image_offset(image, 2, 3), 41);
-  EXPECT_EQ(kel_image_ptr(image, 2, 3), image->data + 41);
-  EXPECT_EQ(kel_image_offset(image, 0, 0), 0);
-  kel_image_delete(image);
-}
-
-TEST(ImageAddressing, ClearZeroesTheWholeAreaAndNothingElse) {
-  // A record placed by hand in a larger buffer shows exactly how far the clear reaches.
+// A record placed by hand in a larger buffer shows exactly how far the clear reaches.
+TEST(ImageAddressing, FollowsStrideAndPixelSizeAndClearCoversTheWholeArea) {
   std::vector<uint8_t> memory(100, 0xAB);
   kel_image image{memory.data() + 8, 4, 5, 16, 3};
+  EXPECT_EQ(kel_image_offset(&image, 2, 3), 41);
+  EXPECT_EQ(kel_image_ptr(&image, 2, 3), image.data + 41);
+  EXPECT_EQ(kel_image_offset(&image, 0, 0), 0);
   kel_image_clear(&image);
-  for (size_t i = 0; i < memory.size(); ++i) {
+  for (size_t i = 0; i < memory.size(); ++i)
     EXPECT_EQ(memory[i], (i >= 8 && i < 72) ? 0 : 0xAB) << i;
-  }
 }
 
 TEST(RowTable, PointsAtEveryRowAndLeavesTheRestAlone) {
   uint8_t buf[256];
   uint8_t *rows[5] = {nullptr, nullptr, nullptr, nullptr, nullptr};
   kel_images_1D_to_2D(buf, 4, 48, rows);
-  EXPECT_EQ(rows[0], buf);
-  EXPECT_EQ(rows[1], buf + 48);
-  EXPECT_EQ(rows[2], buf + 96);
-  EXPECT_EQ(rows[3], buf + 144);
+  EXPECT_EQ(std::vector<uint8_t *>(rows, rows + 5),
+            (std::vector<uint8_t *>{buf, buf + 48, buf + 96, buf + 144, nullptr}));
+  kel_images_1D_to_2D(buf, 0, 48, rows + 4);
   EXPECT_EQ(rows[4], nullptr);
-  uint8_t *untouched[1] = {nullptr};
-  kel_images_1D_to_2D(buf, 0, 48, untouched);
-  EXPECT_EQ(untouched[0], nullptr);
 }
 
 TEST(SetPixel, ClipsWithUnsignedComparisons) {

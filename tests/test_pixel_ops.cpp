@@ -2,86 +2,57 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <random>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "kel_images.h"
 #include "kel_outside.h"
+#include "test_support.h"
 
 namespace {
 
-using Bytes = std::vector<uint8_t>;
+using kel_test::Bytes;
+using kel_test::random_bytes;
 
-Bytes random_bytes(size_t count, uint32_t seed, int low = 0, int high = 255) {
-  std::mt19937 generator(seed);
-  std::uniform_int_distribution<int> value(low, high);
-  Bytes bytes(count);
-  for (uint8_t &b : bytes) b = static_cast<uint8_t>(value(generator));
-  return bytes;
-}
-
-// ---------------------------------------------------------------------------------------------
-// Brighten and darken
-// ---------------------------------------------------------------------------------------------
+// ---- Brighten, darken and the mask ------------------------------------------------------------
 
 using PointOp = void (*)(const uint8_t *, uint32_t, uint32_t, uint32_t, uint8_t *);
 
-struct PointCase {
-  const char *name;
-  PointOp op;
-  uint32_t percent;
-  Bytes in, out;
-};
-
-const PointCase kPointCases[] = {
-    {"brighten",
-     kel_image_brighten,
-     50,
-     {0, 1, 2, 99, 200, 254, 255},
-     {127, 128, 128, 177, 227, 254, 255}},
-    {"brighten", kel_image_brighten, 99, {0, 155, 254}, {252, 254, 254}},
-    {"brighten", kel_image_brighten, 1, {0, 99, 155, 156}, {2, 100, 156, 156}},
-    {"brighten", kel_image_brighten, 0, {0, 77, 255}, {0, 77, 255}},
-    {"brighten", kel_image_brighten, 100, {0, 77, 255}, {255, 255, 255}},
-    {"brighten", kel_image_brighten, 150, {0, 77, 255}, {255, 255, 255}},
-    {"brighten", kel_image_brighten, UINT32_MAX, {0, 77, 255}, {255, 255, 255}},
-    {"darken",
-     kel_image_darken,
-     50,
-     {255, 254, 200, 100, 99, 2, 1, 0},
-     {128, 127, 100, 50, 50, 1, 1, 0}},
-    {"darken", kel_image_darken, 99, {255, 100, 1}, {3, 1, 1}},
-    {"darken", kel_image_darken, 1, {255, 100, 99}, {253, 99, 99}},
-    {"darken", kel_image_darken, 0, {0, 77, 255}, {0, 77, 255}},
-    {"darken", kel_image_darken, 100, {0, 77, 255}, {0, 0, 0}},
-    {"darken", kel_image_darken, 150, {0, 77, 255}, {0, 0, 0}},
-    {"darken", kel_image_darken, UINT32_MAX, {0, 77, 255}, {0, 0, 0}},
-};
-
-TEST(PointOps, KnownValuesOutOfPlaceAndInPlace) {
-  for (const PointCase &c : kPointCases) {
-    SCOPED_TRACE(testing::Message() << c.name << " " << c.percent);
+TEST(PointOps, WorkedValuesOutOfPlaceAndInPlace) {
+  const struct {
+    PointOp op;
+    uint32_t percent;
+    Bytes in, out;
+  } kCases[] = {
+      {kel_image_brighten, 50, {0, 1, 2, 99, 200, 254, 255}, {127, 128, 128, 177, 227, 254, 255}},
+      {kel_image_brighten, 99, {0, 155, 254}, {252, 254, 254}},
+      {kel_image_brighten, 1, {0, 99, 155, 156}, {2, 100, 156, 156}},
+      {kel_image_darken, 50, {255, 254, 200, 100, 99, 2, 1, 0}, {128, 127, 100, 50, 50, 1, 1, 0}},
+      {kel_image_darken, 99, {255, 100, 1}, {3, 1, 1}},
+      {kel_image_darken, 1, {255, 100, 99}, {253, 99, 99}},
+  };
+  for (const auto &c : kCases) {
+    SCOPED_TRACE(testing::Message()
+                 << (c.op == kel_image_darken ? "darken " : "brighten ") << c.percent);
     const uint32_t count = static_cast<uint32_t>(c.in.size());
-    Bytes out(count, 0xAA);
+    Bytes out(count, 0xAA), in_place = c.in;
     c.op(c.in.data(), 1, count, c.percent, out.data());
-    EXPECT_EQ(out, c.out);
-    Bytes in_place = c.in;
     c.op(in_place.data(), count, 1, c.percent, in_place.data());
+    EXPECT_EQ(out, c.out);
     EXPECT_EQ(in_place, c.out);
   }
 }
 
-// The 16-bit arithmetic must equal the 32-bit formula for every value and every percentage.
+// The fast arithmetic must equal the plain formula for every value and percentage; percentages
+// of 100 or more act as 100, and the two operations mirror each other.
 TEST(PointOps, EqualThePlainFormulaForEveryValueAndPercent) {
   Bytes all(256);
   for (int v = 0; v < 256; ++v) all[v] = static_cast<uint8_t>(v);
-  std::vector<uint32_t> percents;
+  std::vector<uint32_t> percents = {150u, 65536u + 50u, UINT32_MAX};
   for (uint32_t p = 0; p <= 101; ++p) percents.push_back(p);
-  percents.insert(percents.end(), {150u, 65536u + 50u, UINT32_MAX});
   for (uint32_t percent : percents) {
-    const uint32_t p = percent < 100 ? percent : 100;
+    const uint32_t p = std::min(percent, 100u);
     Bytes up(256), down(256);
     kel_image_brighten(all.data(), 16, 16, percent, up.data());
     kel_image_darken(all.data(), 16, 16, percent, down.data());
@@ -93,174 +64,55 @@ TEST(PointOps, EqualThePlainFormulaForEveryValueAndPercent) {
   }
 }
 
+// Each call writes exactly height * width bytes, counted in 32 bits, from its start.
 TEST(PointOps, PixelCountWrapsIn32Bits) {
-  struct SizeCase {
-    uint32_t height, width, count;
-  };
-  const SizeCase kSizes[] = {
-      {0, 5, 0}, {5, 0, 0}, {65536, 65536, 0}, {65537, 65537, 131073}, {1, 3, 3}};
-  for (const SizeCase &c : kSizes) {
-    SCOPED_TRACE(testing::Message() << c.height << " x " << c.width);
-    const Bytes src(c.count + 16, 200);
-    Bytes dst(c.count + 16, 9);
-    kel_image_brighten(src.data(), c.height, c.width, 100, dst.data());
-    kel_image_darken(src.data(), c.height, c.width, 100, dst.data() + 1);
-    kel_get_mask(src.data(), c.height, c.width, 200, dst.data() + 2);
-    // Each call writes exactly count bytes from its start; the bytes after them stay 9.
-    for (size_t i = c.count + 2; i < dst.size(); ++i) ASSERT_EQ(dst[i], 9) << i;
-    if (c.count > 0) {
-      EXPECT_EQ(dst[0], 255);
-      EXPECT_EQ(dst[1], 0);
-      EXPECT_EQ(dst[c.count + 1], 0);
+  const uint32_t kSizes[][3] = {{0, 5, 0}, {5, 0, 0}, {65536, 65536, 0}, {65537, 65537, 131073}};
+  for (const auto &c : kSizes) {
+    SCOPED_TRACE(testing::Message() << c[0] << " x " << c[1]);
+    const Bytes src(c[2] + 16, 200);
+    Bytes dst(c[2] + 16, 9);
+    kel_image_brighten(src.data(), c[0], c[1], 100, dst.data());
+    kel_image_darken(src.data(), c[0], c[1], 100, dst.data() + 1);
+    kel_get_mask(src.data(), c[0], c[1], 200, dst.data() + 2);
+    Bytes expected(c[2] + 16, 9);
+    if (c[2] > 0) {
+      expected[0] = 255;
+      std::fill_n(expected.begin() + 1, c[2] + 1, 0);
     }
+    EXPECT_EQ(dst, expected);
   }
 }
-
-// ---------------------------------------------------------------------------------------------
-// Mask extraction
-// ---------------------------------------------------------------------------------------------
 
 TEST(GetMask, ZeroExactlyWhereThePixelEqualsTheKey) {
-  struct MaskCase {
-    int32_t key;
-    Bytes expected;
-  };
-  const Bytes image = {7, 0, 7, 255, 8};
-  const MaskCase kCases[] = {{7, {0, 1, 0, 1, 1}},      {0, {1, 0, 1, 1, 1}},
-                             {255, {1, 1, 1, 0, 1}},    {256, {1, 1, 1, 1, 1}},
-                             {-1, {1, 1, 1, 1, 1}},     {INT32_MIN, {1, 1, 1, 1, 1}},
-                             {7 + 256, {1, 1, 1, 1, 1}}};
-  for (const MaskCase &c : kCases) {
-    SCOPED_TRACE(c.key);
-    Bytes mask(5, 0xAA);
-    kel_get_mask(image.data(), 1, 5, c.key, mask.data());
-    EXPECT_EQ(mask, c.expected);
-    Bytes in_place = image;
-    kel_get_mask(in_place.data(), 5, 1, c.key, in_place.data());
-    EXPECT_EQ(in_place, c.expected);
+  const Bytes image = {7, 0, 7, 255, 8}, none = {1, 1, 1, 1, 1};
+  const std::pair<int32_t, Bytes> kCases[] = {
+      {7, {0, 1, 0, 1, 1}}, {0, {1, 0, 1, 1, 1}}, {255, {1, 1, 1, 0, 1}}, {256, none},
+      {-1, none},           {INT32_MIN, none},    {7 + 256, none}};
+  for (const auto &c : kCases) {
+    Bytes mask(5, 0xAA), in_place = image;
+    kel_get_mask(image.data(), 1, 5, c.first, mask.data());
+    kel_get_mask(in_place.data(), 5, 1, c.first, in_place.data());
+    EXPECT_EQ(mask, c.second) << c.first;
+    EXPECT_EQ(in_place, c.second) << c.first;
   }
 }
 
-// ---------------------------------------------------------------------------------------------
-// Paste and blend
-// ---------------------------------------------------------------------------------------------
+// ---- Paste and blend ----------------------------------------------------------------------------
 
 using CompositeOp = void (*)(uint8_t *, int32_t, int32_t, const uint8_t *, uint16_t, uint16_t,
                              int32_t, int32_t, uint16_t);
-
-// A picture as a string, one row after another.
-Bytes picture(const std::vector<std::string> &rows) {
-  Bytes pixels;
-  for (const std::string &row : rows) pixels.insert(pixels.end(), row.begin(), row.end());
-  return pixels;
-}
 
 uint8_t blended(uint8_t d, uint8_t s) {
   return static_cast<uint8_t>((d + s) >> 1);
 }
 
-struct ClipCase {
-  int32_t x, y;
-  std::vector<std::string> pasted;  // the 4 x 6 destination after pasting "abcd/efgh/ijkl"
-};
-
-const std::vector<std::string> kUntouched = {"......", "......", "......", "......"};
-
-const ClipCase kClipCases[] = {
-    {1, 1, {"......", ".abcd.", ".efgh.", ".ijkl."}},
-    {0, 0, {"abcd..", "efgh..", "ijkl..", "......"}},
-    {-3, 0, {"d.....", "h.....", "l.....", "......"}},
-    {0, -2, {"ijkl..", "......", "......", "......"}},
-    {-1, -1, {"fgh...", "jkl...", "......", "......"}},
-    {4, 2, {"......", "......", "....ab", "....ef"}},
-    {5, 3, {"......", "......", "......", ".....a"}},
-    {-3, -2, {"l.....", "......", "......", "......"}},
-    {-4, 0, kUntouched},
-    {6, 0, kUntouched},
-    {0, -3, kUntouched},
-    {0, 4, kUntouched},
-    // Placements that break the caller's no-overflow promise are still clipped correctly.
-    {INT32_MIN, 0, kUntouched},
-    {INT32_MAX, 0, kUntouched},
-    {0, INT32_MIN, kUntouched},
-    {0, INT32_MAX, kUntouched},
-};
-
-TEST(Composite, ClipsAtEveryEdge) {
-  const Bytes source = picture({"abcd", "efgh", "ijkl"});
-  for (const ClipCase &c : kClipCases) {
-    SCOPED_TRACE(testing::Message() << "x " << c.x << " y " << c.y);
-    const Bytes pasted = picture(c.pasted);
-    for (uint16_t key : {uint16_t{0}, uint16_t{255}, uint16_t{256}}) {
-      Bytes dst = picture(kUntouched);
-      kel_image_draw_image(dst.data(), 4, 6, source.data(), 3, 4, c.x, c.y, key);
-      EXPECT_EQ(dst, pasted) << "paste, key " << key;
-      dst = picture(kUntouched);
-      kel_image_blend_image(dst.data(), 4, 6, source.data(), 3, 4, c.x, c.y, key);
-      for (size_t i = 0; i < dst.size(); ++i) {
-        ASSERT_EQ(dst[i], blended('.', pasted[i])) << "blend, key " << key << " at " << i;
-      }
-    }
-  }
-}
-
-TEST(Composite, EmptySizesWriteNothing) {
-  struct SizeCase {
-    int32_t dst_height, dst_width;
-    uint16_t src_height, src_width;
-  };
-  const SizeCase kSizes[] = {{4, 6, 0, 4},
-                             {4, 6, 3, 0},
-                             {0, 6, 3, 4},
-                             {4, 0, 3, 4},
-                             {-1, 6, 3, 4},
-                             {4, -5, 3, 4},
-                             {INT32_MIN, INT32_MIN, 3, 4}};
-  const Bytes source(12, 'x');
-  for (const SizeCase &c : kSizes) {
-    for (CompositeOp op : {kel_image_draw_image, kel_image_blend_image}) {
-      Bytes dst = picture(kUntouched);
-      op(dst.data(), c.dst_height, c.dst_width, source.data(), c.src_height, c.src_width, -1, -1,
-         256);
-      EXPECT_EQ(dst, picture(kUntouched))
-          << c.dst_height << " " << c.dst_width << " " << c.src_height << " " << c.src_width;
-    }
-  }
-}
-
-TEST(Composite, KeyMakesExactlyThatSourceValueTransparent) {
-  struct KeyCase {
-    uint16_t key;
-    Bytes pasted, blended;
-  };
-  const Bytes source = {0, 255, 7, 0, 255, 1};
-  const Bytes under = {255, 100, 100, 2, 255, 2};
-  // Blending covers 0 over 255 -> 127, 1 over 2 -> 1 and 255 over 255 -> 255.
-  const KeyCase kCases[] = {
-      {0, {255, 255, 7, 2, 255, 1}, {255, 177, 53, 2, 255, 1}},
-      {255, {0, 100, 7, 0, 255, 1}, {127, 100, 53, 1, 255, 1}},
-      {7, {0, 255, 100, 0, 255, 1}, {127, 177, 100, 1, 255, 1}},
-      {256, {0, 255, 7, 0, 255, 1}, {127, 177, 53, 1, 255, 1}},
-      {65535, {0, 255, 7, 0, 255, 1}, {127, 177, 53, 1, 255, 1}},
-  };
-  for (const KeyCase &c : kCases) {
-    SCOPED_TRACE(c.key);
-    Bytes dst = under;
-    kel_image_draw_image(dst.data(), 2, 3, source.data(), 2, 3, 0, 0, c.key);
-    EXPECT_EQ(dst, c.pasted);
-    dst = under;
-    kel_image_blend_image(dst.data(), 2, 3, source.data(), 2, 3, 0, 0, c.key);
-    EXPECT_EQ(dst, c.blended);
-  }
-}
-
 // The plain way: every source pixel in row-major order, read just before its target is written.
-void reference_composite(bool blend, uint8_t *dst, int32_t dst_height, int32_t dst_width,
-                         const uint8_t *src, int32_t src_height, int32_t src_width, int32_t x,
-                         int32_t y, uint16_t key) {
-  for (int32_t sy = 0; sy < src_height; ++sy) {
-    for (int32_t sx = 0; sx < src_width; ++sx) {
-      const int32_t dx = x + sx, dy = y + sy;
+void reference_composite(bool blend, uint8_t *dst, int64_t dst_height, int64_t dst_width,
+                         const uint8_t *src, int64_t src_height, int64_t src_width, int64_t x,
+                         int64_t y, uint16_t key) {
+  for (int64_t sy = 0; sy < src_height; ++sy) {
+    for (int64_t sx = 0; sx < src_width; ++sx) {
+      const int64_t dx = x + sx, dy = y + sy;
       if (dx < 0 || dx >= dst_width || dy < 0 || dy >= dst_height) continue;
       const uint8_t s = src[sy * src_width + sx];
       if (key <= 255 && s == key) continue;
@@ -270,14 +122,105 @@ void reference_composite(bool blend, uint8_t *dst, int32_t dst_height, int32_t d
   }
 }
 
+TEST(Composite, ClipsAtEveryEdge) {
+  const Bytes source = kel_test::from_rows({"abcd", "efgh", "ijkl"});
+  const struct {
+    int32_t x, y;
+    kel_test::Rows pasted;  // the 4 x 6 destination of '.' after pasting the 3 x 4 source
+  } kCases[] = {
+      {-3, 0, {"d.....", "h.....", "l.....", "......"}},
+      {0, -2, {"ijkl..", "......", "......", "......"}},
+      {-1, -1, {"fgh...", "jkl...", "......", "......"}},
+      {4, 2, {"......", "......", "....ab", "....ef"}},
+  };
+  for (const auto &c : kCases) {
+    Bytes dst(24, '.');
+    kel_image_draw_image(dst.data(), 4, 6, source.data(), 3, 4, c.x, c.y, 256);
+    EXPECT_EQ(kel_test::to_rows(dst.data(), 4, 6), c.pasted) << c.x << ", " << c.y;
+  }
+}
+
+TEST(Composite, KeyMakesExactlyThatSourceValueTransparent) {
+  const Bytes source = {0, 255, 7, 0, 255, 1}, under = {255, 100, 100, 2, 255, 2};
+  // Blending covers 0 over 255 -> 127, 1 over 2 -> 1 and 255 over 255 -> 255.
+  const struct {
+    uint16_t key;
+    Bytes pasted, blended;
+  } kCases[] = {
+      {0, {255, 255, 7, 2, 255, 1}, {255, 177, 53, 2, 255, 1}},
+      {255, {0, 100, 7, 0, 255, 1}, {127, 100, 53, 1, 255, 1}},
+      {7, {0, 255, 100, 0, 255, 1}, {127, 177, 100, 1, 255, 1}},
+      {256, {0, 255, 7, 0, 255, 1}, {127, 177, 53, 1, 255, 1}},
+      {65535, {0, 255, 7, 0, 255, 1}, {127, 177, 53, 1, 255, 1}},
+  };
+  for (const auto &c : kCases) {
+    Bytes pasted = under, blend = under;
+    kel_image_draw_image(pasted.data(), 2, 3, source.data(), 2, 3, 0, 0, c.key);
+    kel_image_blend_image(blend.data(), 2, 3, source.data(), 2, 3, 0, 0, c.key);
+    EXPECT_EQ(pasted, c.pasted) << c.key;
+    EXPECT_EQ(blend, c.blended) << c.key;
+  }
+}
+
+struct Placement {
+  int32_t dst_offset, src_offset, dst_height, dst_width, src_height, src_width, x, y;
+};
+
+// Runs both routines on one buffer, with and without a key, against the plain visiting order.
+// Values 0..7 make the key 3 dense; 0..255 leave long stretches without it; 2s and 4s hold no 3
+// at first, but their blends are 3s written ahead of the pixels still to be read.
+void expect_plain_order(const Placement &c) {
+  for (int high : {7, 255, 4}) {
+    for (uint16_t key : {uint16_t{256}, uint16_t{3}}) {
+      for (bool blend : {false, true}) {
+        SCOPED_TRACE(testing::Message()
+                     << c.dst_offset << " " << c.src_offset << " " << c.dst_height << "x"
+                     << c.dst_width << " at " << c.x << ", " << c.y << " key " << key << " blend "
+                     << blend << " values up to " << high);
+        Bytes expected = random_bytes(4096, 11, 0, high);
+        if (high == 4) {
+          for (uint8_t &v : expected) v = v < 3 ? 2 : 4;
+        }
+        Bytes actual = expected;
+        reference_composite(blend, expected.data() + c.dst_offset, c.dst_height, c.dst_width,
+                            expected.data() + c.src_offset, c.src_height, c.src_width, c.x, c.y,
+                            key);
+        const CompositeOp op = blend ? kel_image_blend_image : kel_image_draw_image;
+        op(actual.data() + c.dst_offset, c.dst_height, c.dst_width, actual.data() + c.src_offset,
+           static_cast<uint16_t>(c.src_height), static_cast<uint16_t>(c.src_width), c.x, c.y, key);
+        ASSERT_EQ(actual, expected);
+      }
+    }
+  }
+}
+
+// Separate rasters at every placement around a 4 x 6 destination, empty sizes, and placements
+// that break the caller's no-overflow promise.
+TEST(Composite, ClippingMatchesThePlainVisitingOrder) {
+  std::vector<Placement> cases;
+  for (int32_t y = -4; y <= 5; ++y) {
+    for (int32_t x = -5; x <= 7; ++x) cases.push_back({0, 1000, 4, 6, 3, 4, x, y});
+  }
+  for (int32_t extreme : {INT32_MIN, INT32_MAX}) {
+    cases.push_back({0, 1000, 4, 6, 3, 4, extreme, 0});
+    cases.push_back({0, 1000, 4, 6, 3, 4, 0, extreme});
+  }
+  const int32_t kSizes[][4] = {{4, 6, 0, 4},
+                               {4, 6, 3, 0},
+                               {0, 6, 3, 4},
+                               {4, 0, 3, 4},
+                               {-1, 6, 3, 4},
+                               {4, -5, 3, 4},
+                               {INT32_MIN, INT32_MIN, 3, 4}};
+  for (const auto &s : kSizes) cases.push_back({0, 1000, s[0], s[1], s[2], s[3], -1, -1});
+  for (const Placement &c : cases) expect_plain_order(c);
+}
+
 // Source and destination inside one buffer, the destination before, on and after the source,
 // with short and long distances and widths that differ: the row copy must still act as a
 // left-to-right pixel copy.
 TEST(Composite, OverlappingRastersMatchThePlainVisitingOrder) {
-  struct OverlapCase {
-    int32_t dst_offset, src_offset, dst_height, dst_width, src_height, src_width, x, y;
-  };
-  const OverlapCase kCases[] = {
+  const Placement kCases[] = {
       {1, 0, 20, 40, 10, 40, 0, 0},     {3, 0, 20, 40, 10, 40, 0, 0},
       {17, 0, 20, 40, 10, 40, 0, 0},    {0, 1, 20, 40, 10, 40, 0, 0},
       {0, 17, 20, 40, 10, 40, 0, 0},    {0, 0, 20, 40, 10, 40, 0, 0},
@@ -288,204 +231,66 @@ TEST(Composite, OverlappingRastersMatchThePlainVisitingOrder) {
       {0, 0, 10, 300, 3, 299, 100, 0},  {0, 5, 10, 300, 3, 300, 0, 0},
       {0, 0, 10, 300, 3, 300, -100, 0},
   };
-  for (const OverlapCase &c : kCases) {
-    // Values 0..7 make the key 3 dense; 0..255 leave long stretches without it; 2s and 4s hold
-    // no 3 at first, but their blends are 3s written ahead of the pixels still to be read.
-    for (int high : {7, 255, 4}) {
-      for (uint16_t key : {uint16_t{256}, uint16_t{3}}) {
-        for (bool blend : {false, true}) {
-          SCOPED_TRACE(testing::Message()
-                       << c.dst_offset << " " << c.src_offset << " x " << c.x << " y " << c.y
-                       << " key " << key << " blend " << blend << " values up to " << high);
-          Bytes expected = random_bytes(4096, 11, 0, high);
-          if (high == 4) {
-            for (uint8_t &v : expected) v = v < 3 ? 2 : 4;
-          }
-          Bytes actual = expected;
-          reference_composite(blend, expected.data() + c.dst_offset, c.dst_height, c.dst_width,
-                              expected.data() + c.src_offset, c.src_height, c.src_width, c.x, c.y,
-                              key);
-          (blend ? kel_image_blend_image : kel_image_draw_image)(
-              actual.data() + c.dst_offset, c.dst_height, c.dst_width, actual.data() + c.src_offset,
-              static_cast<uint16_t>(c.src_height), static_cast<uint16_t>(c.src_width), c.x, c.y,
-              key);
-          ASSERT_EQ(actual, expected);
-        }
-      }
-    }
-  }
+  for (const Placement &c : kCases) expect_plain_order(c);
 }
 
-// ---------------------------------------------------------------------------------------------
-// Masked-region fill, with our default blur and enlargement
-// ---------------------------------------------------------------------------------------------
+// ---- Masked-region fill, with our default blur and enlargement ---------------------------------
 
-struct Image {
-  uint16_t height, width;
-  Bytes pixels;
-  uint8_t &at(int x, int y) { return pixels[static_cast<size_t>(y) * width + x]; }
-  uint8_t at(int x, int y) const { return pixels[static_cast<size_t>(y) * width + x]; }
-  bool interior(int x, int y) const {
-    return x >= 1 && y >= 1 && x + 2 <= width && y + 2 <= height;
-  }
-};
-
-bool has_neighbour(const Image &mask, int x, int y, bool want_hole) {
-  for (int dy = -1; dy <= 1; ++dy) {
-    for (int dx = -1; dx <= 1; ++dx) {
-      const int nx = x + dx, ny = y + dy;
-      if ((dx || dy) && nx >= 0 && ny >= 0 && nx < mask.width && ny < mask.height &&
-          (mask.at(nx, ny) == 0) == want_hole) {
-        return true;
-      }
-    }
-  }
-  return false;
-}
-
-Image fill(const Image &src, const Image &mask) {
-  Image dst{src.height, src.width, Bytes(src.pixels.size(), 0xAA)};
-  kel_mask_image(src.pixels.data(), src.height, src.width, mask.pixels.data(), dst.pixels.data());
-  return dst;
-}
-
-// When every border pixel holds v, the grid fills with v wherever there is an edge and a
-// constant grid stays constant through blur and enlargement: every hole pixel becomes v, and
-// the seam then takes the blur of that picture.
-Image expected_constant_fill(const Image &src, const Image &mask, uint8_t v) {
-  Image filled = src;
-  for (size_t i = 0; i < filled.pixels.size(); ++i) {
-    if (mask.pixels[i] == 0) filled.pixels[i] = v;
-  }
-  Image blurred = filled;
-  kel_blur_uint8(filled.pixels.data(), src.height, src.width, blurred.pixels.data());
-  Image expected = filled;
-  for (int y = 0; y < src.height; ++y) {
-    for (int x = 0; x < src.width; ++x) {
-      if (mask.at(x, y) == 0 && src.interior(x, y) && has_neighbour(mask, x, y, false)) {
-        expected.at(x, y) = blurred.at(x, y);
-      }
-    }
-  }
-  return expected;
-}
-
-// Sets every interior known pixel next to the hole to `border`, every other known pixel next to
-// it (edge rows and columns) to `edge`, and the rest to `inside`.
-Image source_for(const Image &mask, uint8_t border, uint8_t edge, uint8_t inside) {
-  Image src{mask.height, mask.width, Bytes(mask.pixels.size(), inside)};
-  for (int y = 0; y < mask.height; ++y) {
-    for (int x = 0; x < mask.width; ++x) {
-      if (mask.at(x, y) != 0 && has_neighbour(mask, x, y, true)) {
-        src.at(x, y) = mask.interior(x, y) ? border : edge;
-      }
-    }
-  }
-  return src;
-}
-
-Image mask_with_holes(uint16_t height, uint16_t width,
-                      const std::vector<std::vector<int>> &rects /* x0, y0, x1, y1 */) {
-  Image mask{height, width, Bytes(size_t{height} * width, 1)};
-  for (const std::vector<int> &r : rects) {
-    for (int y = r[1]; y <= r[3]; ++y) {
-      for (int x = r[0]; x <= r[2]; ++x) mask.at(x, y) = 0;
-    }
-  }
-  return mask;
-}
-
-TEST(MaskImage, NoHoleLeavesTheSource) {
-  const Image src{37, 53, random_bytes(37 * 53, 3)};
-  const Image mask{37, 53, random_bytes(37 * 53, 4, 1, 255)};
-  EXPECT_EQ(fill(src, mask).pixels, src.pixels);
-}
-
+// When every border pixel holds 60, the grid fills with 60 and a constant grid stays constant
+// through blur and enlargement: every hole pixel becomes 60, and the interior seam then takes
+// the blur of that picture. Known pixels beside the hole on the image's edge hold 250, which
+// would show in a hole pixel on the edge if it were softened.
 TEST(MaskImage, ConstantEdgeFillsTheHoleAndSoftensOnlyTheInteriorSeam) {
-  struct HoleCase {
+  const struct {
     const char *what;
     uint16_t height, width;
-    std::vector<std::vector<int>> holes;
-  };
-  const HoleCase kCases[] = {
+    std::vector<std::vector<int>> holes;  // x0, y0, x1, y1
+  } kCases[] = {
       {"one cell spreads to the whole grid", 64, 72, {{30, 30, 30, 30}}},
       {"hole in the first and last rows", 24, 16, {{3, 0, 7, 6}, {9, 17, 13, 23}}},
       {"hole in the first and last columns", 19, 21, {{0, 4, 5, 9}, {15, 10, 20, 14}}},
       {"sides not multiples of 8", 29, 35, {{10, 9, 27, 22}, {2, 2, 2, 2}}},
       {"everything but a ring", 40, 40, {{0, 0, 39, 9}, {0, 10, 9, 39}, {12, 12, 39, 39}}},
   };
-  for (const HoleCase &c : kCases) {
+  for (const auto &c : kCases) {
     SCOPED_TRACE(c.what);
-    const Image mask = mask_with_holes(c.height, c.width, c.holes);
-    const Image src = source_for(mask, 60, 250, 200);
-    const Image expected = expected_constant_fill(src, mask, 60);
-    EXPECT_EQ(fill(src, mask).pixels, expected.pixels);
-  }
-}
-
-TEST(MaskImage, EdgeRowHoleIsFilledButNotSoftened) {
-  // The edge value 250 beside the hole in row 0 would show in a softened pixel there.
-  const Image mask = mask_with_holes(24, 16, {{3, 0, 7, 6}});
-  const Image src = source_for(mask, 60, 250, 200);
-  const Image dst = fill(src, mask);
-  EXPECT_EQ(dst.at(3, 0), 60);
-  EXPECT_EQ(dst.at(7, 0), 60);
-  EXPECT_NE(dst.at(3, 1), 60);  // the interior seam beneath it is softened
-}
-
-TEST(MaskImage, WithoutEdgeValuesTheHoleTakesTheEmptyGrid) {
-  struct EmptyCase {
-    uint16_t height, width;
-    Bytes mask;
-  };
-  const EmptyCase kCases[] = {
-      {5, 9, Bytes(45, 0)},                                // no known pixel at all
-      {2, 7, {1, 0, 0, 1, 0, 1, 1, 0, 0, 0, 1, 0, 1, 1}},  // no interior pixels
-      {9, 2, {0, 1, 1, 0, 0, 0, 1, 1, 0, 1, 0, 1, 1, 0, 0, 1, 1, 1}},
-      {1, 1, {0}},
-  };
-  for (const EmptyCase &c : kCases) {
-    SCOPED_TRACE(testing::Message() << c.height << " x " << c.width);
-    const Image src{c.height, c.width, random_bytes(c.mask.size(), 5, 1, 255)};
-    const Image dst = fill(src, Image{c.height, c.width, c.mask});
-    for (size_t i = 0; i < c.mask.size(); ++i) {
-      EXPECT_EQ(dst.pixels[i], c.mask[i] == 0 ? 0 : src.pixels[i]) << i;
+    const size_t count = size_t{c.height} * c.width;
+    Bytes mask_values(count, 1);
+    for (const std::vector<int> &r : c.holes) {
+      for (int y = r[1]; y <= r[3]; ++y) {
+        for (int x = r[0]; x <= r[2]; ++x) mask_values[size_t(y) * c.width + x] = 0;
+      }
     }
+    const kel_test::Mask mask{c.height, c.width, mask_values.data()};
+    Bytes src(count, 200), filled(count);
+    for (int i = 0; i < int(count); ++i) {
+      const int x = i % c.width, y = i / c.width;
+      if (!mask.hole(x, y) && mask.next_to(x, y, true)) src[i] = mask.interior(x, y) ? 60 : 250;
+      filled[i] = mask.hole(x, y) ? 60 : src[i];
+    }
+    Bytes expected = filled, blurred(count), dst(count, 0xAA);
+    kel_blur_uint8(filled.data(), c.height, c.width, blurred.data());
+    for (int i = 0; i < int(count); ++i) {
+      if (mask.seam(i % c.width, i / c.width)) expected[i] = blurred[i];
+    }
+    kel_mask_image(src.data(), c.height, c.width, mask_values.data(), dst.data());
+    EXPECT_EQ(dst, expected);
   }
 }
 
-TEST(MaskImage, InPlaceEqualsSeparateDestination) {
-  for (uint16_t side : {uint16_t{3}, uint16_t{8}, uint16_t{37}, uint16_t{61}}) {
-    const uint16_t width = static_cast<uint16_t>(side + 5);
-    const Image src{side, width, random_bytes(size_t{side} * width, side)};
-    const Image mask{side, width, random_bytes(size_t{side} * width, side + 1u, 0, 3)};
-    Image in_place = src;
-    kel_mask_image(in_place.pixels.data(), side, width, mask.pixels.data(), in_place.pixels.data());
-    EXPECT_EQ(in_place.pixels, fill(src, mask).pixels) << side;
-  }
-}
-
-TEST(MaskImage, ZeroSizesWriteNothing) {
-  const Bytes src(8, 5), mask(8, 0);
-  for (auto size : {std::pair<uint16_t, uint16_t>{0, 8}, {8, 0}, {0, 0}}) {
-    Bytes dst(8, 0xAA);
-    kel_mask_image(src.data(), size.first, size.second, mask.data(), dst.data());
-    EXPECT_EQ(dst, Bytes(8, 0xAA));
-  }
-}
-
-// ---------------------------------------------------------------------------------------------
-// Our default blur and enlargement
-// ---------------------------------------------------------------------------------------------
+// ---- Our default blur and enlargement ----------------------------------------------------------
 
 TEST(DefaultBlur, ImpulseGivesTheBinomialKernel) {
-  Bytes impulse(25, 0);
+  Bytes impulse(25, 0), out(25, 0xAA);
   impulse[12] = 255;
-  Bytes out(25, 0xAA);
   kel_blur_uint8(impulse.data(), 5, 5, out.data());
-  const Bytes expected = {0,  0, 0, 0,  0,  0,  16, 32, 16, 0, 0, 32, 64,
-                          32, 0, 0, 16, 32, 16, 0,  0,  0,  0, 0, 0};
-  EXPECT_EQ(out, expected);
+  // clang-format off
+  EXPECT_EQ(out, (Bytes{0,  0,  0,  0, 0,
+                        0, 16, 32, 16, 0,
+                        0, 32, 64, 32, 0,
+                        0, 16, 32, 16, 0,
+                        0,  0,  0,  0, 0}));
+  // clang-format on
 }
 
 TEST(DefaultBlur, ConstantStaysAndInPlaceEqualsOutOfPlace) {
@@ -498,10 +303,8 @@ TEST(DefaultBlur, ConstantStaysAndInPlaceEqualsOutOfPlace) {
     Bytes constant(count, 93), out(count, 0);
     kel_blur_uint8(constant.data(), size.first, size.second, out.data());
     EXPECT_EQ(out, constant);
-
-    const Bytes noise = random_bytes(count, size.second);
-    kel_blur_uint8(noise.data(), size.first, size.second, out.data());
-    Bytes in_place = noise;
+    Bytes in_place = random_bytes(count, size.second);
+    kel_blur_uint8(in_place.data(), size.first, size.second, out.data());
     kel_blur_uint8(in_place.data(), size.first, size.second, in_place.data());
     EXPECT_EQ(in_place, out);
   }
@@ -509,17 +312,12 @@ TEST(DefaultBlur, ConstantStaysAndInPlaceEqualsOutOfPlace) {
   kel_blur_uint8(nullptr, 5, 0, nullptr);
 }
 
-TEST(DefaultScale, InterpolatesBetweenAlignedSampleCentres) {
-  const Bytes ramp = {0, 255};
-  Bytes out(8, 0xAA);
-  kel_scale_up_bilinear_uint8(ramp.data(), 1, 2, 4, out.data(), 1, 8);
-  EXPECT_EQ(out, (Bytes{0, 0, 32, 96, 159, 223, 255, 255}));
-}
-
 // The documented arithmetic, pixel by pixel: the centre of output pixel i lies at input
 // position (2i + 1 - factor) / (2 factor), clamped to the first and last sample; the weight of
-// the second sample is rounded down to 1/256; the total is rounded half up.
+// the second sample is rounded down to 1/256; the total is rounded half up. Nothing to enlarge
+// gives 0.
 uint8_t documented_scale(const Bytes &in, int in_height, int in_width, int factor, int x, int y) {
+  if (in_height == 0 || in_width == 0 || factor == 0) return 0;
   struct Sample {
     int first, second, weight;
   };
@@ -530,66 +328,32 @@ uint8_t documented_scale(const Bytes &in, int in_height, int in_width, int facto
     return Sample{scaled / span, scaled / span + 1, (scaled % span) * 256 / span};
   };
   const Sample c = locate(x, in_width), r = locate(y, in_height);
-  auto at = [&](int row, int col) {
-    return uint32_t{in[static_cast<size_t>(row) * in_width + col]};
-  };
+  auto at = [&](int row, int col) { return uint32_t{in[size_t(row) * in_width + col]}; };
   const uint32_t upper = at(r.first, c.first) * (256 - c.weight) + at(r.first, c.second) * c.weight;
   const uint32_t lower =
       at(r.second, c.first) * (256 - c.weight) + at(r.second, c.second) * c.weight;
   return static_cast<uint8_t>((upper * (256 - r.weight) + lower * r.weight + 32768) >> 16);
 }
 
-TEST(DefaultScale, EqualsTheDocumentedArithmetic) {
-  struct ScaleCase {
-    uint16_t in_height, in_width, factor, out_height, out_width;
-  };
-  const ScaleCase kCases[] = {{3, 4, 8, 24, 32},   {5, 300, 8, 40, 2400}, {7, 9, 3, 23, 29},
-                              {4, 200, 1, 4, 200}, {6, 5, 2, 14, 13},     {2, 3, 5, 10, 15}};
-  for (const ScaleCase &c : kCases) {
-    SCOPED_TRACE(testing::Message() << c.in_height << " x " << c.in_width << " by " << c.factor);
-    const Bytes in = random_bytes(size_t{c.in_height} * c.in_width, c.factor);
-    Bytes out(size_t{c.out_height} * c.out_width);
-    kel_scale_up_bilinear_uint8(in.data(), c.in_height, c.in_width, c.factor, out.data(),
-                                c.out_height, c.out_width);
-    for (int y = 0; y < c.out_height; ++y) {
-      for (int x = 0; x < c.out_width; ++x) {
-        ASSERT_EQ(out[static_cast<size_t>(y) * c.out_width + x],
-                  documented_scale(in, c.in_height, c.in_width, c.factor, x, y))
-            << x << ", " << y;
-      }
+// Every output pixel is written (outputs prefilled with 0 and with 255 agree), also beyond the
+// input's enlarged size.
+TEST(DefaultScale, WritesEveryPixelAsDocumented) {
+  const uint16_t kCases[][5] = {{3, 4, 8, 24, 32},   {5, 300, 8, 40, 2400}, {7, 9, 3, 23, 29},
+                                {4, 200, 1, 4, 200}, {6, 5, 2, 14, 13},     {2, 3, 5, 10, 15},
+                                {3, 4, 8, 30, 40},   {1, 1, 8, 8, 8},       {2, 2, 1, 9, 9},
+                                {0, 4, 8, 3, 5},     {4, 0, 8, 3, 5},       {4, 4, 0, 3, 5},
+                                {4, 4, 3, 5, 5}};
+  for (const auto &c : kCases) {
+    SCOPED_TRACE(testing::Message() << c[0] << " x " << c[1] << " by " << c[2]);
+    const Bytes in = random_bytes(size_t{c[0]} * c[1] + 1, c[2]);
+    Bytes expected(size_t{c[3]} * c[4]), low(expected.size(), 0), high(expected.size(), 255);
+    for (size_t i = 0; i < expected.size(); ++i) {
+      expected[i] = documented_scale(in, c[0], c[1], c[2], int(i % c[4]), int(i / c[4]));
     }
-  }
-}
-
-TEST(DefaultScale, WritesEveryOutputPixel) {
-  struct ScaleCase {
-    uint16_t in_height, in_width, factor, out_height, out_width;
-  };
-  const ScaleCase kCases[] = {{3, 4, 8, 24, 32},     {3, 4, 8, 30, 40}, {1, 1, 8, 8, 8},
-                              {5, 300, 8, 40, 2400}, {2, 2, 1, 9, 9},   {4, 4, 3, 5, 5},
-                              {0, 4, 8, 3, 5},       {4, 0, 8, 3, 5},   {4, 4, 0, 3, 5}};
-  for (const ScaleCase &c : kCases) {
-    SCOPED_TRACE(testing::Message() << c.in_height << " x " << c.in_width << " by " << c.factor);
-    const size_t in_count = size_t{c.in_height} * c.in_width;
-    const size_t out_count = size_t{c.out_height} * c.out_width;
-    const bool empty = in_count == 0 || c.factor == 0;
-    const Bytes constant(in_count + 1, 71);
-    Bytes low(out_count, 0), high(out_count, 255);
-    kel_scale_up_bilinear_uint8(constant.data(), c.in_height, c.in_width, c.factor, low.data(),
-                                c.out_height, c.out_width);
-    kel_scale_up_bilinear_uint8(constant.data(), c.in_height, c.in_width, c.factor, high.data(),
-                                c.out_height, c.out_width);
-    EXPECT_EQ(low, Bytes(out_count, empty ? 0 : 71));
-    EXPECT_EQ(high, low);
-
-    const Bytes noise = random_bytes(in_count + 1, c.in_width);
-    std::fill(low.begin(), low.end(), 0);
-    std::fill(high.begin(), high.end(), 255);
-    kel_scale_up_bilinear_uint8(noise.data(), c.in_height, c.in_width, c.factor, low.data(),
-                                c.out_height, c.out_width);
-    kel_scale_up_bilinear_uint8(noise.data(), c.in_height, c.in_width, c.factor, high.data(),
-                                c.out_height, c.out_width);
-    EXPECT_EQ(high, low);
+    kel_scale_up_bilinear_uint8(in.data(), c[0], c[1], c[2], low.data(), c[3], c[4]);
+    kel_scale_up_bilinear_uint8(in.data(), c[0], c[1], c[2], high.data(), c[3], c[4]);
+    EXPECT_EQ(low, expected);
+    EXPECT_EQ(high, expected);
   }
   kel_scale_up_bilinear_uint8(nullptr, 0, 0, 8, nullptr, 0, 0);
 }

@@ -1,0 +1,183 @@
+// Vector variants of the pixel operations' row loops, compiled once per instruction set and
+// picked at run time. The plain loops in pixel_ops.cpp are the reference they are tested
+// against, and finish the last pixels of each row that do not fill a vector.
+#undef HWY_TARGET_INCLUDE
+#define HWY_TARGET_INCLUDE "simd/pixel_ops_simd.cpp"
+#include "simd/pixel_ops_simd.h"
+
+#include <hwy/foreach_target.h>  // must come before highway.h
+#include <hwy/highway.h>
+
+HWY_BEFORE_NAMESPACE();
+namespace kel {
+namespace simd {
+namespace HWY_NAMESPACE {
+namespace hn = hwy::HWY_NAMESPACE;
+
+// The one-lane fallback target has no 16-bit view of a byte vector; it takes the plain loops.
+#define KEL_PIXEL_OPS_VECTORS (HWY_TARGET != HWY_SCALAR)
+
+using D8 = hn::ScalableTag<uint8_t>;
+
+#if KEL_PIXEL_OPS_VECTORS
+// floor(x / 100) for x up to 100 * 255 = 25500, as (x * 5243) >> 19: 5243 / 2^19 exceeds 1/100
+// by less than 1 / (100 * 25500), too little to carry any x past the next multiple of 100.
+// The test checks every percentage and pixel.
+template <class D16>
+hn::Vec<D16> hundredths(D16 d16, hn::Vec<D16> x) {
+  return hn::ShiftRight<3>(hn::MulHigh(x, hn::Set(d16, 5243)));
+}
+
+// floor(percent * base / 100) of every byte, in 16-bit lanes: the even bytes, then the odd
+// ones, put back in place. kComplement takes 255 - byte as the base.
+template <bool kComplement, class D>
+hn::Vec<D> change(D d, hn::Vec<D> pixels, uint16_t percent) {
+  const hn::Repartition<uint16_t, D> d16;
+  using V16 = hn::Vec<decltype(d16)>;
+  const V16 low_bytes = hn::Set(d16, 0x00FF);
+  const V16 words = hn::BitCast(d16, pixels);
+  V16 even = hn::And(words, low_bytes);
+  V16 odd = hn::ShiftRight<8>(words);
+  if (kComplement) {
+    even = hn::Sub(low_bytes, even);
+    odd = hn::Sub(low_bytes, odd);
+  }
+  const V16 p = hn::Set(d16, percent);
+  const V16 even_change = hundredths(d16, hn::Mul(even, p));
+  const V16 odd_change = hundredths(d16, hn::Mul(odd, p));
+  return hn::BitCast(d, hn::Or(even_change, hn::ShiftLeft<8>(odd_change)));
+}
+
+// floor((a + b) / 2): the rounded average less the half that rounding added.
+template <class D>
+hn::Vec<D> floor_average(D d, hn::Vec<D> a, hn::Vec<D> b) {
+  return hn::Sub(hn::AverageRound(a, b), hn::And(hn::Xor(a, b), hn::Set(d, 1)));
+}
+
+// Runs step(d, i) on whole vectors of the row, full ones and then 16-byte ones for the rest,
+// and returns how many pixels they covered; the plain loop finishes the last few.
+template <class Step>
+size_t for_each_vector(size_t count, Step step) {
+  size_t i = 0;
+  const D8 d;
+  for (; count - i >= hn::Lanes(d); i += hn::Lanes(d)) step(d, i);
+  const hn::CappedTag<uint8_t, 16> d16;
+  for (; count - i >= hn::Lanes(d16); i += hn::Lanes(d16)) step(d16, i);
+  return i;
+}
+
+void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
+    const auto pixels = hn::LoadU(d, in + i);
+    hn::StoreU(hn::Add(pixels, change<true>(d, pixels, percent)), d, out + i);
+  });
+  plain::brighten_row(in + done, count - done, percent, out + done);
+}
+
+void DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
+    const auto pixels = hn::LoadU(d, in + i);
+    hn::StoreU(hn::Sub(pixels, change<false>(d, pixels, percent)), d, out + i);
+  });
+  plain::darken_row(in + done, count - done, percent, out + done);
+}
+
+// Short rows copy faster this way than through memmove, which the plain loop uses.
+void CopyRow(const uint8_t *in, size_t count, uint8_t *out) {
+  const size_t done = for_each_vector(
+      count, [&](auto d, size_t i) { hn::StoreU(hn::LoadU(d, in + i), d, out + i); });
+  plain::copy_row(in + done, count - done, out + done);
+}
+
+void BlendRow(const uint8_t *in, size_t count, uint8_t *out) {
+  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
+    hn::StoreU(floor_average(d, hn::LoadU(d, out + i), hn::LoadU(d, in + i)), d, out + i);
+  });
+  plain::blend_row(in + done, count - done, out + done);
+}
+
+// The transparent pixels are left out of the store, so their destination bytes are not written.
+void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
+    const auto source = hn::LoadU(d, in + i);
+    hn::BlendedStore(source, hn::Ne(source, hn::Set(d, key)), d, out + i);
+  });
+  plain::paste_row_with_key(in + done, count - done, key, out + done);
+}
+
+void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
+    const auto source = hn::LoadU(d, in + i);
+    const auto blended = floor_average(d, hn::LoadU(d, out + i), source);
+    hn::BlendedStore(blended, hn::Ne(source, hn::Set(d, key)), d, out + i);
+  });
+  plain::blend_row_with_key(in + done, count - done, key, out + done);
+}
+
+#else
+// The fallback target's variants are the plain loops.
+void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  plain::brighten_row(in, count, percent, out);
+}
+void DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  plain::darken_row(in, count, percent, out);
+}
+void CopyRow(const uint8_t *in, size_t count, uint8_t *out) {
+  plain::copy_row(in, count, out);
+}
+void BlendRow(const uint8_t *in, size_t count, uint8_t *out) {
+  plain::blend_row(in, count, out);
+}
+void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  plain::paste_row_with_key(in, count, key, out);
+}
+void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  plain::blend_row_with_key(in, count, key, out);
+}
+#endif  // KEL_PIXEL_OPS_VECTORS
+
+}  // namespace HWY_NAMESPACE
+}  // namespace simd
+}  // namespace kel
+HWY_AFTER_NAMESPACE();
+
+#if HWY_ONCE
+namespace kel {
+namespace simd {
+
+HWY_EXPORT(BrightenRow);
+HWY_EXPORT(DarkenRow);
+HWY_EXPORT(CopyRow);
+HWY_EXPORT(BlendRow);
+HWY_EXPORT(PasteRowWithKey);
+HWY_EXPORT(BlendRowWithKey);
+
+void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  HWY_DYNAMIC_DISPATCH(BrightenRow)(in, count, percent, out);
+}
+void darken_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  HWY_DYNAMIC_DISPATCH(DarkenRow)(in, count, percent, out);
+}
+void copy_row(const uint8_t *in, size_t count, uint8_t *out) {
+  HWY_DYNAMIC_DISPATCH(CopyRow)(in, count, out);
+}
+void blend_row(const uint8_t *in, size_t count, uint8_t *out) {
+  HWY_DYNAMIC_DISPATCH(BlendRow)(in, count, out);
+}
+void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  HWY_DYNAMIC_DISPATCH(PasteRowWithKey)(in, count, key, out);
+}
+void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  HWY_DYNAMIC_DISPATCH(BlendRowWithKey)(in, count, key, out);
+}
+
+// Each row call through the dispatch asks the library for the chosen target again; a paste of
+// a few hundred short rows takes the three pointers once instead.
+CompositeRowLoops composite_row_loops() {
+  return {&HWY_DYNAMIC_DISPATCH(CopyRow), &HWY_DYNAMIC_DISPATCH(BlendRow),
+          &HWY_DYNAMIC_DISPATCH(PasteRowWithKey), &HWY_DYNAMIC_DISPATCH(BlendRowWithKey)};
+}
+
+}  // namespace simd
+}  // namespace kel
+#endif  // HWY_ONCE

@@ -1,0 +1,160 @@
+// Vector variants of the statistics' pixel loops, compiled once per instruction set and picked
+// at run time. The plain loops in statistics.cpp are the reference they are tested against.
+#undef HWY_TARGET_INCLUDE
+#define HWY_TARGET_INCLUDE "simd/statistics_simd.cpp"
+#include "simd/statistics_simd.h"
+
+#include <hwy/foreach_target.h>  // must come before highway.h
+#include <hwy/highway.h>
+
+HWY_BEFORE_NAMESPACE();
+namespace kel {
+namespace simd {
+namespace HWY_NAMESPACE {
+namespace hn = hwy::HWY_NAMESPACE;
+
+// The one-lane fallback target has no byte zips and sums, and an array of counters needs vectors
+// of a size known when compiling; those targets take the pixel-by-pixel loops below alone.
+#define KEL_STATISTICS_VECTORS (HWY_TARGET != HWY_SCALAR && !HWY_HAVE_SCALABLE)
+
+using D8 = hn::ScalableTag<uint8_t>;
+using V8 = hn::Vec<D8>;
+
+// A byte counter takes at most this many vectors before it is emptied into the totals.
+constexpr uint32_t kByteCounterVectors = 255;
+
+template <class D>
+uint64_t sum_of_lanes(D d, hn::Vec<D> v) {
+  return hn::GetLane(hn::SumOfLanes(d, v));
+}
+
+// The bin of a pixel is its top bits, so comparing the pixel's top bits (the rest masked off)
+// with each bin's lowest value finds it. Each bin keeps one counter per byte lane, which
+// subtracts the all-ones lanes of its comparison; a counter reaches at most 255 before it is
+// summed into the bin's total.
+template <uint32_t kBins>
+void count_bins(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *hist) {
+  const D8 d;
+  const hn::Repartition<uint64_t, D8> d64;
+  const size_t lanes = hn::Lanes(d);
+  const uint32_t shift = 8 - bits;
+  const V8 top_mask = hn::Set(d, static_cast<uint8_t>(0xFF00u >> bits));
+  uint32_t totals[kBins] = {};
+  size_t i = 0;
+#if KEL_STATISTICS_VECTORS
+  while (count - i >= lanes) {
+    const size_t vectors =
+        (count - i) / lanes < kByteCounterVectors ? (count - i) / lanes : kByteCounterVectors;
+    V8 counters[kBins];
+    for (uint32_t bin = 0; bin < kBins; ++bin) counters[bin] = hn::Zero(d);
+    for (size_t v = 0; v < vectors; ++v, i += lanes) {
+      const V8 top = hn::And(hn::LoadU(d, pixels + i), top_mask);
+      for (uint32_t bin = 0; bin < kBins; ++bin) {
+        const auto in_bin = hn::Eq(top, hn::Set(d, static_cast<uint8_t>(bin << shift)));
+        counters[bin] = hn::Sub(counters[bin], hn::VecFromMask(d, in_bin));
+      }
+    }
+    // Each bin's total is below 2^31, so its 32 bits hold it.
+    for (uint32_t bin = 0; bin < kBins; ++bin) {
+      totals[bin] += static_cast<uint32_t>(sum_of_lanes(d64, hn::SumsOf8(counters[bin])));
+    }
+  }
+#else
+  (void)d64;
+  (void)lanes;
+  (void)top_mask;
+#endif
+  for (; i < count; ++i) ++totals[pixels[i] >> shift];
+  for (uint32_t bin = 0; bin < kBins; ++bin) hist[bin] = totals[bin];
+}
+
+void CountTopBits(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *hist) {
+  switch (bits) {
+    case 0:
+      return count_bins<1>(pixels, count, bits, hist);
+    case 1:
+      return count_bins<2>(pixels, count, bits, hist);
+    case 2:
+      return count_bins<4>(pixels, count, bits, hist);
+    case 3:
+      return count_bins<8>(pixels, count, bits, hist);
+    default:
+      return count_bins<16>(pixels, count, bits, hist);
+  }
+}
+
+#if KEL_STATISTICS_VECTORS
+// The squares of the 16-bit lanes, summed in pairs into 32-bit lanes. A lane holds a pixel
+// (0 to 255), so each pair sum is at most 2 * 255^2 and fits exactly.
+template <class D16>
+hn::Vec<hn::Repartition<uint32_t, D16>> pair_squares(D16, hn::Vec<D16> pixels) {
+  const hn::Repartition<int16_t, D16> di16;
+  const hn::Repartition<int32_t, D16> di32;
+  const hn::Vec<decltype(di16)> values = hn::BitCast(di16, pixels);
+  hn::Vec<decltype(di32)> odd = hn::Zero(di32);
+  const hn::Vec<decltype(di32)> even =
+      hn::ReorderWidenMulAccumulate(di32, values, values, hn::Zero(di32), odd);
+  return hn::BitCast(hn::Repartition<uint32_t, D16>(), hn::RearrangeToOddPlusEven(even, odd));
+}
+#endif
+
+// Both sums are wanted modulo 2^32 only, so 32-bit lanes may wrap: the lanes' total is still
+// the true total modulo 2^32. The plain sum goes through 64-bit lanes, which the byte sums of
+// SumsOf8 fill directly.
+PixelSums SumPixels(const uint8_t *pixels, uint32_t count) {
+  PixelSums result{0, 0};
+  size_t i = 0;
+#if KEL_STATISTICS_VECTORS
+  const D8 d;
+  const hn::RepartitionToWide<D8> d16;
+  const hn::Repartition<uint32_t, D8> d32;
+  const hn::Repartition<uint64_t, D8> d64;
+  const size_t lanes = hn::Lanes(d);
+  const V8 zero = hn::Zero(d);
+  hn::Vec<decltype(d64)> sums = hn::Zero(d64);
+  hn::Vec<decltype(d32)> squares = hn::Zero(d32);
+  for (; count - i >= lanes; i += lanes) {
+    const V8 v = hn::LoadU(d, pixels + i);
+    sums = hn::Add(sums, hn::SumsOf8(v));
+    squares = hn::Add(squares, pair_squares(d16, hn::ZipLower(d16, v, zero)));
+    squares = hn::Add(squares, pair_squares(d16, hn::ZipUpper(d16, v, zero)));
+  }
+  result.sum = static_cast<uint32_t>(sum_of_lanes(d64, sums));
+  // The 32-bit lanes are added in 64-bit pairs first: a reduction of 32-bit lanes may be signed
+  // arithmetic inside the instruction set's helpers, where a wrap is undefined.
+  const auto squares64 = hn::BitCast(d64, squares);
+  const auto pairs =
+      hn::Add(hn::And(squares64, hn::Set(d64, 0xFFFFFFFFu)), hn::ShiftRight<32>(squares64));
+  result.sum_of_squares = static_cast<uint32_t>(sum_of_lanes(d64, pairs));
+#endif
+  for (; i < count; ++i) {
+    const uint32_t value = pixels[i];
+    result.sum += value;
+    result.sum_of_squares += value * value;
+  }
+  return result;
+}
+
+}  // namespace HWY_NAMESPACE
+}  // namespace simd
+}  // namespace kel
+HWY_AFTER_NAMESPACE();
+
+#if HWY_ONCE
+namespace kel {
+namespace simd {
+
+HWY_EXPORT(CountTopBits);
+HWY_EXPORT(SumPixels);
+
+void count_top_bits(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *hist) {
+  HWY_DYNAMIC_DISPATCH(CountTopBits)(pixels, count, bits, hist);
+}
+
+PixelSums pixel_sums(const uint8_t *pixels, uint32_t count) {
+  return HWY_DYNAMIC_DISPATCH(SumPixels)(pixels, count);
+}
+
+}  // namespace simd
+}  // namespace kel
+#endif  // HWY_ONCE
