@@ -88,7 +88,8 @@ KEL_API void kel_set_pixel(uint8_t *buf, uint32_t height, uint32_t width, uint32
 
 /* Integer statistics of a plain raster's intensities. The pixel count is height * width as a
  * 32-bit product (wrapping); when that product is 0 or negative read as signed, no pixel is
- * read. Sums are unsigned 32-bit and wrap modulo 2^32, divisions truncate, and the variance is
+ * read. Sizes are the caller's to keep non-negative: two negative sizes give a positive product,
+ * and that many pixels are read. Sums are unsigned 32-bit and wrap modulo 2^32, divisions truncate, and the variance is
  * the population variance about the truncated mean. A count of 0 gives 0 instead of a division
  * by zero. Histograms belong to the caller and must not overlap src. Counting uses about 3 KiB
  * of stack, the image statistics 4 KiB (they also keep a 256-bin histogram there). */

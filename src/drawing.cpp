@@ -205,21 +205,24 @@ void draw_rectangle(const Raster &raster, int64_t x, int64_t y, uint32_t rect_wi
 
 // ---- Numbers -----------------------------------------------------------------------------------
 
-// Each digit is a 4 x 7 cell; pixel p lies in column p % 4 and row p / 4, drawn in list order.
+// Each digit is a 4 x 7 cell.
 constexpr int32_t kGlyphColumns = 4;
 constexpr int32_t kGlyphAdvance = 5;  // one column of box margin shared between neighbours
-constexpr uint8_t kGlyphPixelCounts[10] = {14, 11, 12, 12, 13, 13, 14, 10, 14, 14};
-constexpr int8_t kGlyphPixels[10][14] = {
-    {1, 2, 4, 7, 8, 11, 12, 15, 16, 19, 20, 23, 25, 26},
-    {2, 5, 6, 10, 14, 18, 22, 24, 25, 26, 27, -1, -1, -1},
-    {1, 2, 4, 7, 11, 14, 17, 20, 24, 25, 26, 27, -1, -1},
-    {1, 2, 4, 7, 11, 14, 16, 19, 20, 23, 25, 26, -1, -1},
-    {3, 6, 7, 9, 11, 12, 15, 16, 17, 18, 19, 23, 27, -1},
-    {0, 1, 2, 3, 4, 8, 13, 14, 19, 23, 24, 25, 26, -1},
-    {1, 2, 4, 7, 8, 12, 13, 14, 16, 19, 20, 23, 25, 26},
-    {0, 1, 2, 3, 7, 10, 13, 17, 21, 25, -1, -1, -1, -1},
-    {1, 2, 4, 7, 8, 11, 13, 14, 16, 19, 20, 23, 25, 26},
-    {1, 2, 4, 7, 8, 11, 13, 14, 15, 19, 20, 23, 25, 26},
+// Glyph pixel p (column p % 4, row p / 4) is bit p of its digit's mask. Every glyph's pixels are
+// drawn in increasing index order, so walking the bits from the lowest keeps the drawing order,
+// and ten words hold the whole font. Read from the right, each hex digit is one glyph row, its
+// lowest bit the left column.
+constexpr uint32_t kGlyphMasks[10] = {
+    0x6999996,  // 0
+    0xF444464,  // 1
+    0xF124896,  // 2
+    0x6994896,  // 3
+    0x88F9AC8,  // 4
+    0x788611F,  // 5
+    0x6997196,  // 6
+    0x222248F,  // 7
+    0x6996996,  // 8
+    0x698E996,  // 9
 };
 // Place values of the nine digit positions, units first.
 constexpr int32_t kPlaceValues[9] = {1, 10, 100, 1000, 10000, 100000, 1000000, 10000000, 100000000};
@@ -227,15 +230,16 @@ constexpr int32_t kPlaceValues[9] = {1, 10, 100, 1000, 10000, 100000, 1000000, 1
 // wrong number, and never index past the glyph table.
 constexpr int32_t kLargestShown = 999999999;
 
-// The 6 x 9 background box around the glyph cell at (pen, y), column by column, then the glyph.
+// The 6 x 9 background box around the glyph cell at (pen, y), then the glyph. Box and glyph
+// each have one colour, so only their order shows, not the order within them.
 void draw_digit(const Raster &raster, int32_t digit, int64_t pen, int64_t y, uint8_t colour) {
   const uint8_t background = static_cast<uint8_t>(255 - colour);
   for (int64_t row = y - 1; row <= y + 7; ++row) {
     draw_run(raster, pen - 1, row, 1, 0, Steps{0, kGlyphColumns + 2}, background);
   }
-  for (int32_t k = 0; k < kGlyphPixelCounts[digit]; ++k) {
-    const int32_t p = kGlyphPixels[digit][k];
-    raster.plot(pen + p % kGlyphColumns, y + p / kGlyphColumns, colour);
+  const uint32_t mask = kGlyphMasks[digit];
+  for (int32_t p = 0; p < 28; ++p) {
+    if ((mask >> p) & 1u) raster.plot(pen + p % kGlyphColumns, y + p / kGlyphColumns, colour);
   }
 }
 
