@@ -192,64 +192,120 @@ bool is_known(uint8_t mask_value) {
   return mask_value != 0;
 }
 
-// Whether one of the eight neighbours of an interior mask pixel satisfies the test, asked in
-// the order left, right, upper left, upper, upper right, lower left, lower, lower right.
-template <class Test>
-bool any_neighbour(const uint8_t *mask_pixel, size_t width, Test test) {
-  const uint8_t *above = mask_pixel - width;
-  const uint8_t *below = mask_pixel + width;
-  return test(mask_pixel[-1]) || test(mask_pixel[1]) || test(above[-1]) || test(above[0]) ||
-         test(above[1]) || test(below[-1]) || test(below[0]) || test(below[1]);
+uint8_t max3(uint8_t a, uint8_t b, uint8_t c) {
+  const uint8_t ab = a > b ? a : b;
+  return ab > c ? ab : c;
 }
 
-// Interior columns looked at together by the edge walker below.
-constexpr size_t kEdgePiece = 64;
-
-// Whether the mask holds a 0 in rows y - 1 .. y + 1, columns first - 1 .. last + 1: the 3 x 3
-// windows of the pixels first .. last of row y. Border and seam pixels both have a hole in their
-// window, so a piece of a row without one has neither.
-bool windows_hold_hole(const uint8_t *mask, size_t width, size_t y, size_t first, size_t last) {
-  const uint8_t *corner = mask + (y - 1) * width + (first - 1);
-  const size_t span = last - first + 3;
-  return holds(corner, span, 0) || holds(corner + width, span, 0) ||
-         holds(corner + 2 * width, span, 0);
+uint8_t min3(uint8_t a, uint8_t b, uint8_t c) {
+  const uint8_t ab = a < b ? a : b;
+  return ab < c ? ab : c;
 }
 
-// Calls visit(y, x, index) for every interior pixel whose mask value passes `self` and which
-// has a neighbour whose mask value passes `neighbour`, rows top to bottom, columns left to right.
-// `self` or `neighbour` must be is_hole, so that pieces whose windows hold no hole are skipped.
-template <class SelfTest, class NeighbourTest, class Visit>
-void for_each_interior_edge(const uint8_t *mask, uint16_t height, uint16_t width, SelfTest self,
-                            NeighbourTest neighbour, Visit visit) {
+// Interior columns classified together; a piece's windows take about 1 KiB of stack.
+constexpr size_t kEdgePiece = 256;
+
+// The smallest and largest mask value in the 3 x 3 window of each pixel of one piece of an
+// interior row. A border pixel (known, a hole among its neighbours) has a window minimum of 0,
+// a seam pixel (a hole, a known neighbour) a nonzero window maximum: which neighbour is found
+// first does not change whether one exists. The windows are taken in two separable halves,
+// columns of three and then rows of three, in loops without branches that vectorise.
+struct WindowPiece {
+  size_t first = 0;  // the piece's first column
+  size_t count = 0;
+  uint8_t minimum[kEdgePiece];
+  uint8_t maximum[kEdgePiece];
+};
+
+// Fills `piece` for columns first .. first + count - 1 of row y; returns false, leaving the
+// windows unset, when none of them holds a hole, since such a piece has no border or seam pixel.
+bool look_at_windows(const uint8_t *mask, size_t width, size_t y, size_t first, size_t count,
+                     WindowPiece &piece) {
+  uint8_t column_extreme[kEdgePiece + 2];
+  const uint8_t *above = mask + (y - 1) * width + (first - 1);
+  const uint8_t *row = above + width;
+  const uint8_t *below = row + width;
+  const size_t span = count + 2;
+  for (size_t i = 0; i < span; ++i) column_extreme[i] = min3(above[i], row[i], below[i]);
+  if (!holds(column_extreme, span, 0)) return false;
+  for (size_t i = 0; i < count; ++i) {
+    piece.minimum[i] = min3(column_extreme[i], column_extreme[i + 1], column_extreme[i + 2]);
+  }
+  for (size_t i = 0; i < span; ++i) column_extreme[i] = max3(above[i], row[i], below[i]);
+  for (size_t i = 0; i < count; ++i) {
+    piece.maximum[i] = max3(column_extreme[i], column_extreme[i + 1], column_extreme[i + 2]);
+  }
+  piece.first = first;
+  piece.count = count;
+  return true;
+}
+
+// Calls visit(y, piece) for the pieces of interior rows whose windows hold a hole, rows top to
+// bottom. Pieces end at multiples of kEdgePiece, so no 8-pixel cell straddles two of them.
+template <class Visit>
+void for_each_window_piece(const uint8_t *mask, uint16_t height, uint16_t width, Visit visit) {
   if (height <= 2 || width <= 2) return;
-  const size_t last_interior = size_t{width} - 2;
+  const size_t end = size_t{width} - 1;  // one past the last interior column
+  WindowPiece piece;
   for (size_t y = 1; y + 1 < height; ++y) {
-    for (size_t first = 1; first <= last_interior; first += kEdgePiece) {
-      const size_t piece_end = first + kEdgePiece - 1;
-      const size_t last = piece_end < last_interior ? piece_end : last_interior;
-      if (!windows_hold_hole(mask, width, y, first, last)) continue;
-      for (size_t x = first; x <= last; ++x) {
-        const size_t index = y * width + x;
-        if (self(mask[index]) && any_neighbour(mask + index, width, neighbour)) visit(y, x, index);
-      }
+    for (size_t first = 1; first < end;) {
+      const size_t piece_end = (first / kEdgePiece + 1) * kEdgePiece;
+      const size_t last_end = piece_end < end ? piece_end : end;
+      if (look_at_windows(mask, width, y, first, last_end - first, piece)) visit(y, piece);
+      first = last_end;
     }
   }
 }
 
 // Each cell takes the largest source value among its border pixels (known pixels next to the
-// hole); a value of 0 leaves it empty.
+// hole); a value of 0 leaves it empty. A piece's border values are set out first, 0 elsewhere,
+// and then each cell takes the largest of its eight.
 void gather_edge_values(const uint8_t *src, const uint8_t *mask, uint16_t height, uint16_t width,
                         uint8_t *grid, uint16_t grid_width) {
-  for_each_interior_edge(mask, height, width, is_known, is_hole,
-                         [&](size_t y, size_t x, size_t index) {
-                           uint8_t &cell = grid[(y >> 3) * grid_width + (x >> 3)];
-                           if (cell < src[index]) cell = src[index];
-                         });
+  uint8_t border_values[kEdgePiece];
+  for_each_window_piece(mask, height, width, [&](size_t y, const WindowPiece &piece) {
+    const size_t offset = y * width + piece.first;
+    const uint8_t *mask_row = mask + offset;
+    const uint8_t *src_row = src + offset;
+    const uint8_t *window_minimum = piece.minimum;
+    const size_t count = piece.count;
+    for (size_t i = 0; i < count; ++i) {
+      const bool border = is_known(mask_row[i]) && window_minimum[i] == 0;
+      border_values[i] = border ? src_row[i] : 0;
+    }
+    uint8_t *cells = grid + (y >> 3) * grid_width;
+    for (size_t i = 0; i < piece.count;) {
+      const size_t x = piece.first + i;
+      const size_t cell_end = (x | 7) + 1;
+      const size_t n = cell_end - x < piece.count - i ? cell_end - x : piece.count - i;
+      uint8_t largest = 0;
+      for (size_t k = 0; k < n; ++k)
+        largest = border_values[i + k] > largest ? border_values[i + k] : largest;
+      uint8_t &cell = cells[x >> 3];
+      if (cell < largest) cell = largest;
+      i += n;
+    }
+  });
 }
 
-uint8_t max3(uint8_t a, uint8_t b, uint8_t c) {
-  const uint8_t ab = a > b ? a : b;
-  return ab > c ? ab : c;
+// The seam (interior hole pixels next to kept ones) takes the blurred result. The blurred raster
+// is a separate buffer, so the order of these writes does not matter, and the other pixels are
+// stored back unchanged, which lets the loop run as vector selects.
+void soften_seam(const uint8_t *mask, uint16_t height, uint16_t width, const uint8_t *blurred,
+                 uint8_t *dst) {
+  for_each_window_piece(mask, height, width, [&](size_t y, const WindowPiece &piece) {
+    const size_t offset = y * width + piece.first;
+    const uint8_t *mask_row = mask + offset;
+    const uint8_t *blurred_row = blurred + offset;
+    uint8_t *dst_row = dst + offset;
+    const uint8_t *window_maximum = piece.maximum;
+    const size_t count = piece.count;
+    for (size_t i = 0; i < count; ++i) {
+      const bool seam = is_hole(mask_row[i]) && window_maximum[i] != 0;
+      const uint8_t kept = dst_row[i];
+      dst_row[i] = seam ? blurred_row[i] : kept;
+    }
+  });
 }
 
 // Grid columns handled at a time by the vertical half of a dilation pass.
@@ -378,12 +434,8 @@ void fill_masked(const uint8_t *src, uint16_t height, uint16_t width, const uint
     }
   }
 
-  // The seam (interior hole pixels next to kept ones) takes the blurred result; the blurred
-  // raster is a separate buffer, so the order of these writes does not matter.
   kel_blur_uint8(dst, height, width, scratch.blurred);
-  for_each_interior_edge(mask, height, width, is_hole, is_known, [&](size_t, size_t, size_t index) {
-    dst[index] = scratch.blurred[index];
-  });
+  soften_seam(mask, height, width, scratch.blurred, dst);
 }
 
 }  // namespace

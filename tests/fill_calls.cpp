@@ -154,15 +154,18 @@ void seed_cell(Picture &p, int x, int y, uint8_t value) {
 // destination: the gathered and dilated grid is smoothed in place, enlarged by 8 into its own
 // raster; holes take the enlarged raster, the filled image is blurred into a third raster, and
 // the interior seam takes that. Sizes without interior pixels gather nothing and soften nothing;
-// zero sizes still make all three calls and write nothing.
+// zero sizes still make all three calls and write nothing; without a hole the source is kept.
 TEST(FillCalls, ArgumentsOrderAndWhatIsDoneWithTheResults) {
   const uint16_t kSizes[][2] = {{20, 27}, {2, 7}, {9, 2}, {1, 1},
                                 {0, 5},   {5, 0}, {0, 0}, {0, 65528}};
   for (const auto &size : kSizes) {
-    for (bool in_place : {false, true}) {
+    for (int variant = 0; variant < 4; ++variant) {
+      const bool in_place = variant % 2, no_hole = variant / 2;
       SCOPED_TRACE(testing::Message()
-                   << size[0] << " x " << size[1] << (in_place ? " in place" : ""));
-      const Picture p = random_picture(size[0], size[1], size[0] + 1u);
+                   << size[0] << " x " << size[1] << (in_place ? " in place" : "")
+                   << (no_hole ? " without a hole" : ""));
+      Picture p = random_picture(size[0], size[1], size[0] + 1u);
+      if (no_hole) std::replace(p.mask.begin(), p.mask.end(), uint8_t{0}, uint8_t{1});
       const kel_test::Mask mask = p.classes();
       Guarded src(p.src.size(), 0), dst(p.src.size(), 0xEE);
       std::copy(p.src.begin(), p.src.end(), src.data());

@@ -2,9 +2,11 @@
 
 #include <climits>
 #include <cstdint>
+#include <utility>
 #include <vector>
 
 #include "kel_images.h"
+#include "test_support.h"
 
 namespace {
 
@@ -81,21 +83,19 @@ TEST(RowTable, PointsAtEveryRowAndLeavesTheRestAlone) {
   EXPECT_EQ(rows[4], nullptr);
 }
 
+// On a guarded 10 x 10 raster; x passes through the 16-bit parameter.
 TEST(SetPixel, ClipsWithUnsignedComparisons) {
-  struct Case {
-    uint32_t y;
-    uint32_t x;  // passed through the 16-bit parameter
-    int expected_offset;
+  const std::pair<std::pair<uint32_t, uint32_t>, int> kCases[] = {
+      {{3, 4}, 34},  {{0, 0}, 0},           {{9, 9}, 99},         {{10, 0}, -1},
+      {{0, 10}, -1}, {{UINT32_MAX, 0}, -1}, {{3, 65536 + 4}, 34}, {{3, 65535}, -1},
   };
-  const Case cases[] = {
-      {3, 4, 34},  {0, 0, 0},           {9, 9, 99},         {10, 0, -1},
-      {0, 10, -1}, {UINT32_MAX, 0, -1}, {3, 65536 + 4, 34}, {3, 65535, -1},
-  };
-  for (const Case &c : cases) {
-    SCOPED_TRACE(testing::Message() << "y " << c.y << " x " << c.x);
-    std::vector<uint8_t> raster(100, 0);
-    kel_set_pixel(raster.data(), 10, 10, c.y, static_cast<uint16_t>(c.x), 7);
-    for (int i = 0; i < 100; ++i) EXPECT_EQ(raster[i], i == c.expected_offset ? 7 : 0) << i;
+  for (const auto &[at, offset] : kCases) {
+    kel_test::Guarded raster(100, 0);
+    kel_set_pixel(raster.data(), 10, 10, at.first, static_cast<uint16_t>(at.second), 7);
+    std::vector<uint8_t> expected(100, 0);
+    if (offset >= 0) expected[size_t(offset)] = 7;
+    EXPECT_EQ(raster.inside(), expected) << "y " << at.first << " x " << at.second;
+    EXPECT_TRUE(raster.guards_intact()) << "y " << at.first << " x " << at.second;
   }
 }
 

@@ -1,8 +1,6 @@
 // Helpers shared by the test programs: seeded random rasters, rasters with guard bytes, rasters
-// as rows of characters, and the pixel classes of a mask.
+// as rows of characters, and the pixel classes of the masked fill.
 #pragma once
-
-#include <gtest/gtest.h>
 
 #include <algorithm>
 #include <cstddef>
@@ -45,12 +43,7 @@ struct Guarded {
   }
 };
 
-// A picture given as rows of characters, as pixels; and pixels back as rows.
-inline Bytes from_rows(const Rows &rows) {
-  Bytes pixels;
-  for (const std::string &row : rows) pixels.insert(pixels.end(), row.begin(), row.end());
-  return pixels;
-}
+// A raster as rows of characters, one per pixel, to compare with a picture.
 inline Rows to_rows(const uint8_t *pixels, int32_t height, int32_t width) {
   Rows rows;
   for (int32_t y = 0; y < height; ++y) {

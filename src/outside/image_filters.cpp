@@ -71,8 +71,9 @@ void blur_columns(uint8_t *pixels, size_t height, size_t width) {
 // Bilinear enlargement by an integer factor.
 // ---------------------------------------------------------------------------------------------
 
-// Output columns whose sample positions are computed at a time (6 bytes each on the stack).
-constexpr size_t kScaleStrip = 128;
+// Output columns handled at a time: 6 bytes of sample position and 4 of blended input rows
+// each, on the stack.
+constexpr size_t kScaleStrip = 256;
 
 // The two input samples an output pixel lies between, and the weight of the second one in
 // 1/256 units (0 .. 255).
@@ -99,15 +100,48 @@ Tap locate(uint32_t out_index, uint32_t factor, uint32_t in_size) {
 }
 
 // Both weights carry 8 fraction bits, so the total carries 16 and is rounded half up; with
-// 255 * 2^16 at most it fits 32 bits. The input rows are blended first: that changes no bit of
-// the total, and each blended sample serves every output column between its neighbours.
-uint16_t blend_rows(uint8_t top, uint8_t bottom, uint32_t weight_bottom) {
-  return static_cast<uint16_t>(top * (256 - weight_bottom) + bottom * weight_bottom);
+// 255 * 2^16 at most it fits 32 bits. The total is an exact sum of four products, so any order of
+// adding them gives the same bits: the input rows are first blended along the columns, once per
+// input row and strip, and each output row then only mixes two such blended rows with one
+// vertical weight, a loop without lookups that vectorises.
+uint16_t blend_columns(const uint8_t *row, Tap column) {
+  return static_cast<uint16_t>(row[column.first] * (256u - column.weight_second) +
+                               row[column.second] * uint32_t{column.weight_second});
 }
 
-uint8_t blend_columns(uint16_t left, uint16_t right, uint32_t weight_right) {
-  const uint32_t total = left * (256 - weight_right) + right * weight_right;
-  return static_cast<uint8_t>((total + 32768u) >> 16);
+// `shift` drops low bits that are known to be 0 (see blend_rows_coarse).
+void blend_row_of_columns(const uint8_t *row, const Tap *columns, size_t count, unsigned shift,
+                          uint16_t *out) {
+  for (size_t i = 0; i < count; ++i)
+    out[i] = static_cast<uint16_t>(blend_columns(row, columns[i]) >> shift);
+}
+
+void blend_rows(const uint16_t *top, const uint16_t *bottom, uint32_t weight_bottom, size_t count,
+                uint8_t *out) {
+  const uint32_t weight_top = 256 - weight_bottom;
+  for (size_t i = 0; i < count; ++i) {
+    const uint32_t total = top[i] * weight_top + bottom[i] * weight_bottom;
+    out[i] = static_cast<uint8_t>((total + 32768u) >> 16);
+  }
+}
+
+// When the factor divides 8, every weight is a whole multiple of 16 (fraction * 128 / factor,
+// the fraction odd or 0), so the blended rows were stored divided by 16 (at most 4080) and the
+// total is 256 times a sum below 2^16: the same bits in 16-bit lanes, twice as many per vector.
+constexpr unsigned kCoarseShift = 4;
+
+bool weights_are_coarse(uint16_t factor) {
+  return factor != 0 && 8 % factor == 0;
+}
+
+void blend_rows_coarse(const uint16_t *top, const uint16_t *bottom, uint32_t weight_bottom,
+                       size_t count, uint8_t *out) {
+  const auto bottom_part = static_cast<uint16_t>(weight_bottom >> kCoarseShift);
+  const auto top_part = static_cast<uint16_t>(16 - bottom_part);
+  for (size_t i = 0; i < count; ++i) {
+    const auto total = static_cast<uint16_t>(top[i] * top_part + bottom[i] * bottom_part + 128);
+    out[i] = static_cast<uint8_t>(total >> 8);
+  }
 }
 
 }  // namespace
@@ -129,30 +163,40 @@ void kel_scale_up_bilinear_uint8(const uint8_t *in, uint16_t in_height, uint16_t
     std::memset(out, 0, out_pixels);  // nothing to enlarge: a defined, all-0 result
     return;
   }
-  // Column strips: the sample positions of a strip's columns are found once and reused on
-  // every row, so the divisions do not run per pixel. With a factor of at least 1, the 128
-  // columns of a strip lie between at most 129 consecutive input columns.
+  // Column strips: the sample positions of a strip's columns are found once, and each input
+  // row is blended along them once for all the output rows between it and its neighbours.
+  const bool coarse = weights_are_coarse(factor);
+  const unsigned shift = coarse ? kCoarseShift : 0;
   Tap columns[kScaleStrip];
-  uint16_t blended[kScaleStrip + 1];
+  uint16_t blended[2][kScaleStrip];
   for (size_t start = 0; start < out_width; start += kScaleStrip) {
     const size_t count = strip_length(start, out_width, kScaleStrip);
     for (size_t i = 0; i < count; ++i) {
       columns[i] = locate(static_cast<uint32_t>(start + i), factor, in_width);
     }
-    const size_t first_input = columns[0].first;
-    const size_t input_count = size_t{columns[count - 1].second} - first_input + 1;
+    uint16_t *top = blended[0];
+    uint16_t *bottom = blended[1];
+    Tap rows_held{0, 0, 0};
+    bool held = false;
     for (size_t y = 0; y < out_height; ++y) {
       const Tap row = locate(static_cast<uint32_t>(y), factor, in_height);
-      const uint8_t *top = in + size_t{row.first} * in_width + first_input;
-      const uint8_t *bottom = in + size_t{row.second} * in_width + first_input;
-      for (size_t j = 0; j < input_count; ++j) {
-        blended[j] = blend_rows(top[j], bottom[j], row.weight_second);
+      if (!held || row.first != rows_held.first || row.second != rows_held.second) {
+        if (held && row.first == rows_held.second) {
+          uint16_t *const reused = bottom;  // moving down one input row: the bottom becomes top
+          bottom = top;
+          top = reused;
+        } else {
+          blend_row_of_columns(in + size_t{row.first} * in_width, columns, count, shift, top);
+        }
+        blend_row_of_columns(in + size_t{row.second} * in_width, columns, count, shift, bottom);
+        rows_held = row;
+        held = true;
       }
       uint8_t *out_row = out + y * out_width + start;
-      for (size_t i = 0; i < count; ++i) {
-        const Tap column = columns[i];
-        out_row[i] = blend_columns(blended[column.first - first_input],
-                                   blended[column.second - first_input], column.weight_second);
+      if (coarse) {
+        blend_rows_coarse(top, bottom, row.weight_second, count, out_row);
+      } else {
+        blend_rows(top, bottom, row.weight_second, count, out_row);
       }
     }
   }
