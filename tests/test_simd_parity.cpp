@@ -11,6 +11,7 @@
 
 #include "kel_images.h"
 #include "simd/pixel_ops_simd.h"
+#include "simd/rotation_simd.h"
 #include "simd/statistics_simd.h"
 
 namespace {
@@ -177,6 +178,20 @@ TEST(SimdParity, PasteAndBlendRows) {
         }
       }
     }
+  });
+}
+
+// Sampled positions rarely land on a bilinear total just above a multiple of 2^28, where
+// truncating toward zero and rounding down differ by the last unit. Neighbours -1, -1, -1, 0 at
+// fractions 1/16384 give exactly -2^28 + 1, which must become 0.
+TEST(SimdParity, SignedRotationTruncatesTowardZeroAtTheLastUnit) {
+  std::vector<int8_t> source(8 * 8, -1);
+  source[1 * 8 + 1] = 0;
+  const kel::simd::RotationRow run{source.data(), 8, 8, 1, 1, 0, 0, 64};
+  for_each_target([&] {
+    std::vector<int8_t> out(64, 99);
+    const size_t done = kel::simd::rotate_row_bilinear(run, out.data());
+    for (size_t i = 0; i < done; ++i) ASSERT_EQ(out[i], 0) << i;
   });
 }
 
