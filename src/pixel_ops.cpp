@@ -10,10 +10,11 @@
 
 namespace {
 
-// Whether any of count bytes equals value; no early exit, so that it vectorises.
+// Whether any of count bytes equals value; no early exit and a byte-wide flag, so that it
+// vectorises without widening.
 bool holds(const uint8_t *bytes, size_t count, uint8_t value) {
-  unsigned found = 0;
-  for (size_t i = 0; i < count; ++i) found |= bytes[i] == value ? 1u : 0u;
+  uint8_t found = 0;
+  for (size_t i = 0; i < count; ++i) found |= static_cast<uint8_t>(bytes[i] == value);
   return found != 0;
 }
 
@@ -202,23 +203,59 @@ uint8_t min3(uint8_t a, uint8_t b, uint8_t c) {
   return ab < c ? ab : c;
 }
 
+// The columns from a row's first hole pixel to its last, half open; empty when it has none.
+struct ColumnRange {
+  size_t first = 0;
+  size_t end = 0;
+  bool empty() const { return first >= end; }
+};
+
+ColumnRange merged(ColumnRange a, ColumnRange b) {
+  if (a.empty()) return b;
+  if (b.empty()) return a;
+  return {a.first < b.first ? a.first : b.first, a.end > b.end ? a.end : b.end};
+}
+
+// Most mask rows hold no hole, and those that do hold it in a short stretch: memchr finds the
+// first hole at memory speed, and the last is sought backwards a block at a time.
+ColumnRange hole_columns(const uint8_t *mask_row, size_t width) {
+  const void *first_hole = width != 0 ? std::memchr(mask_row, 0, width) : nullptr;
+  if (first_hole == nullptr) return {};
+  const size_t first = static_cast<size_t>(static_cast<const uint8_t *>(first_hole) - mask_row);
+  constexpr size_t kBlock = 64;
+  size_t end = width;
+  while (end - first > kBlock && !holds(mask_row + end - kBlock, kBlock, 0)) end -= kBlock;
+  while (mask_row[end - 1] != 0) --end;  // stops at `first` at the latest
+  return {first, end};
+}
+
 // Interior columns classified together; a piece's windows take about 1 KiB of stack.
 constexpr size_t kEdgePiece = 256;
 
-// The smallest and largest mask value in the 3 x 3 window of each pixel of one piece of an
-// interior row. A border pixel (known, a hole among its neighbours) has a window minimum of 0,
-// a seam pixel (a hole, a known neighbour) a nonzero window maximum: which neighbour is found
-// first does not change whether one exists. The windows are taken in two separable halves,
-// columns of three and then rows of three, in loops without branches that vectorise.
+// Which extreme of each pixel's 3 x 3 window of mask values is taken. A border pixel (known, a
+// hole among its neighbours) has a window minimum of 0, a seam pixel (a hole, a known
+// neighbour) a nonzero window maximum: which neighbour is found first does not change whether
+// one exists.
+enum class Extreme { kSmallest, kLargest };
+
+// The chosen extreme of the window of each pixel of one piece of an interior row, taken in two
+// separable halves, columns of three and then rows of three, in loops without branches that
+// vectorise.
 struct WindowPiece {
   size_t first = 0;  // the piece's first column
   size_t count = 0;
-  uint8_t minimum[kEdgePiece];
-  uint8_t maximum[kEdgePiece];
+  uint8_t extreme[kEdgePiece];
 };
 
+template <Extreme kWhich>
+uint8_t extreme3(uint8_t a, uint8_t b, uint8_t c) {
+  return kWhich == Extreme::kSmallest ? min3(a, b, c) : max3(a, b, c);
+}
+
 // Fills `piece` for columns first .. first + count - 1 of row y; returns false, leaving the
-// windows unset, when none of them holds a hole, since such a piece has no border or seam pixel.
+// windows unset, when the piece can hold no border pixel (no window holds a hole) or no seam
+// pixel (no pixel is a hole).
+template <Extreme kWhich>
 bool look_at_windows(const uint8_t *mask, size_t width, size_t y, size_t first, size_t count,
                      WindowPiece &piece) {
   uint8_t column_extreme[kEdgePiece + 2];
@@ -226,14 +263,13 @@ bool look_at_windows(const uint8_t *mask, size_t width, size_t y, size_t first, 
   const uint8_t *row = above + width;
   const uint8_t *below = row + width;
   const size_t span = count + 2;
-  for (size_t i = 0; i < span; ++i) column_extreme[i] = min3(above[i], row[i], below[i]);
-  if (!holds(column_extreme, span, 0)) return false;
+  if (kWhich == Extreme::kLargest && !holds(row + 1, count, 0)) return false;
+  for (size_t i = 0; i < span; ++i)
+    column_extreme[i] = extreme3<kWhich>(above[i], row[i], below[i]);
+  if (kWhich == Extreme::kSmallest && !holds(column_extreme, span, 0)) return false;
   for (size_t i = 0; i < count; ++i) {
-    piece.minimum[i] = min3(column_extreme[i], column_extreme[i + 1], column_extreme[i + 2]);
-  }
-  for (size_t i = 0; i < span; ++i) column_extreme[i] = max3(above[i], row[i], below[i]);
-  for (size_t i = 0; i < count; ++i) {
-    piece.maximum[i] = max3(column_extreme[i], column_extreme[i + 1], column_extreme[i + 2]);
+    piece.extreme[i] =
+        extreme3<kWhich>(column_extreme[i], column_extreme[i + 1], column_extreme[i + 2]);
   }
   piece.first = first;
   piece.count = count;
@@ -241,134 +277,175 @@ bool look_at_windows(const uint8_t *mask, size_t width, size_t y, size_t first, 
 }
 
 // Calls visit(y, piece) for the pieces of interior rows whose windows hold a hole, rows top to
-// bottom. Pieces end at multiples of kEdgePiece, so no 8-pixel cell straddles two of them.
-template <class Visit>
+// bottom. Only the columns whose windows reach between the first and last hole of the three
+// rows are looked at. Pieces end at multiples of kEdgePiece, so no 8-pixel cell straddles two
+// of them.
+template <Extreme kWhich, class Visit>
 void for_each_window_piece(const uint8_t *mask, uint16_t height, uint16_t width, Visit visit) {
   if (height <= 2 || width <= 2) return;
-  const size_t end = size_t{width} - 1;  // one past the last interior column
+  ColumnRange above = hole_columns(mask, width);
+  ColumnRange row = hole_columns(mask + width, width);
   WindowPiece piece;
   for (size_t y = 1; y + 1 < height; ++y) {
-    for (size_t first = 1; first < end;) {
+    const ColumnRange below = hole_columns(mask + (y + 1) * width, width);
+    const ColumnRange holes = merged(merged(above, row), below);
+    above = row;
+    row = below;
+    if (holes.empty()) continue;
+    // Interior columns x with a hole among x - 1 .. x + 1.
+    const size_t start = holes.first > 1 ? holes.first - 1 : 1;
+    const size_t end = holes.end + 1 < size_t{width} - 1 ? holes.end + 1 : size_t{width} - 1;
+    for (size_t first = start; first < end;) {
       const size_t piece_end = (first / kEdgePiece + 1) * kEdgePiece;
       const size_t last_end = piece_end < end ? piece_end : end;
-      if (look_at_windows(mask, width, y, first, last_end - first, piece)) visit(y, piece);
+      if (look_at_windows<kWhich>(mask, width, y, first, last_end - first, piece)) {
+        visit(y, piece);
+      }
       first = last_end;
     }
   }
 }
 
+// dst[i] takes from[i] where take[i] is 0xFF and keeps its value where it is 0. Written as a
+// bitwise blend, not a branch, so that the loop vectorises.
+void select_bytes(const uint8_t *take, const uint8_t *from, size_t count, uint8_t *dst) {
+  for (size_t i = 0; i < count; ++i) {
+    dst[i] = static_cast<uint8_t>((from[i] & take[i]) | (dst[i] & ~take[i]));
+  }
+}
+
+// 0xFF for true, 0 for false.
+uint8_t all_or_none(bool condition) {
+  return static_cast<uint8_t>(condition ? 0xFF : 0);
+}
+
 // Each cell takes the largest source value among its border pixels (known pixels next to the
 // hole); a value of 0 leaves it empty. A piece's border values are set out first, 0 elsewhere,
-// and then each cell takes the largest of its eight.
+// from the start of the piece's first cell, and then each cell with a nonzero value among its
+// eight takes the largest; border pixels are few, so most cells are passed over a word at a
+// time.
 void gather_edge_values(const uint8_t *src, const uint8_t *mask, uint16_t height, uint16_t width,
                         uint8_t *grid, uint16_t grid_width) {
+  // Pieces lie inside one kEdgePiece-aligned block of columns, so a piece with the lead to its
+  // first cell's start fits.
   uint8_t border_values[kEdgePiece];
-  for_each_window_piece(mask, height, width, [&](size_t y, const WindowPiece &piece) {
-    const size_t offset = y * width + piece.first;
-    const uint8_t *mask_row = mask + offset;
-    const uint8_t *src_row = src + offset;
-    const uint8_t *window_minimum = piece.minimum;
-    const size_t count = piece.count;
-    for (size_t i = 0; i < count; ++i) {
-      const bool border = is_known(mask_row[i]) && window_minimum[i] == 0;
-      border_values[i] = border ? src_row[i] : 0;
+  for_each_window_piece<Extreme::kSmallest>(
+      mask, height, width, [&](size_t y, const WindowPiece &piece) {
+        const size_t offset = y * width + piece.first;
+        const uint8_t *mask_row = mask + offset;
+        const uint8_t *src_row = src + offset;
+        const size_t lead = piece.first & (kBlockSide - 1);
+        const size_t used = lead + piece.count;
+        const size_t padded = (used + kBlockSide - 1) & ~size_t{kBlockSide - 1};
+        std::memset(border_values, 0, lead);
+        std::memset(border_values + used, 0, padded - used);
+        uint8_t *values = border_values + lead;
+        for (size_t i = 0; i < piece.count; ++i) {
+          const bool border = is_known(mask_row[i]) & (piece.extreme[i] == 0);
+          values[i] = static_cast<uint8_t>(src_row[i] & all_or_none(border));
+        }
+        uint8_t *cells = grid + (y >> 3) * grid_width + (piece.first >> 3);
+        for (size_t i = 0; i < padded; i += kBlockSide) {
+          uint64_t eight;
+          std::memcpy(&eight, border_values + i, sizeof eight);
+          if (eight == 0) continue;
+          uint8_t largest = 0;
+          for (size_t k = 0; k < kBlockSide; ++k) {
+            largest = border_values[i + k] > largest ? border_values[i + k] : largest;
+          }
+          uint8_t &cell = cells[i / kBlockSide];
+          if (cell < largest) cell = largest;
+        }
+      });
+}
+
+// Every hole pixel, edge rows and columns included, takes the enlarged surface. Only the
+// stretch of each row between its first and last hole is looked at.
+void fill_holes(const uint8_t *mask, uint16_t height, uint16_t width, const uint8_t *enlarged,
+                uint16_t enlarged_width, uint8_t *dst) {
+  uint8_t take[kEdgePiece];
+  for (size_t y = 0; y < height; ++y) {
+    const uint8_t *mask_row = mask + y * width;
+    const ColumnRange holes = hole_columns(mask_row, width);
+    for (size_t first = holes.first; first < holes.end; first += kEdgePiece) {
+      const size_t count = holes.end - first < kEdgePiece ? holes.end - first : kEdgePiece;
+      for (size_t i = 0; i < count; ++i) take[i] = all_or_none(is_hole(mask_row[first + i]));
+      select_bytes(take, enlarged + y * enlarged_width + first, count, dst + y * width + first);
     }
-    uint8_t *cells = grid + (y >> 3) * grid_width;
-    for (size_t i = 0; i < piece.count;) {
-      const size_t x = piece.first + i;
-      const size_t cell_end = (x | 7) + 1;
-      const size_t n = cell_end - x < piece.count - i ? cell_end - x : piece.count - i;
-      uint8_t largest = 0;
-      for (size_t k = 0; k < n; ++k)
-        largest = border_values[i + k] > largest ? border_values[i + k] : largest;
-      uint8_t &cell = cells[x >> 3];
-      if (cell < largest) cell = largest;
-      i += n;
-    }
-  });
+  }
 }
 
 // The seam (interior hole pixels next to kept ones) takes the blurred result. The blurred raster
-// is a separate buffer, so the order of these writes does not matter, and the other pixels are
-// stored back unchanged, which lets the loop run as vector selects.
+// is a separate buffer, so the order of these writes does not matter.
 void soften_seam(const uint8_t *mask, uint16_t height, uint16_t width, const uint8_t *blurred,
                  uint8_t *dst) {
-  for_each_window_piece(mask, height, width, [&](size_t y, const WindowPiece &piece) {
-    const size_t offset = y * width + piece.first;
-    const uint8_t *mask_row = mask + offset;
-    const uint8_t *blurred_row = blurred + offset;
-    uint8_t *dst_row = dst + offset;
-    const uint8_t *window_maximum = piece.maximum;
-    const size_t count = piece.count;
-    for (size_t i = 0; i < count; ++i) {
-      const bool seam = is_hole(mask_row[i]) && window_maximum[i] != 0;
-      const uint8_t kept = dst_row[i];
-      dst_row[i] = seam ? blurred_row[i] : kept;
-    }
-  });
+  uint8_t take[kEdgePiece];
+  for_each_window_piece<Extreme::kLargest>(
+      mask, height, width, [&](size_t y, const WindowPiece &piece) {
+        const size_t offset = y * width + piece.first;
+        const uint8_t *mask_row = mask + offset;
+        for (size_t i = 0; i < piece.count; ++i) {
+          take[i] = all_or_none(is_hole(mask_row[i]) & (piece.extreme[i] != 0));
+        }
+        select_bytes(take, blurred + offset, piece.count, dst + offset);
+      });
 }
 
-// Grid columns handled at a time by the vertical half of a dilation pass.
-constexpr size_t kDilateStrip = 256;
+// The dilation step of a cell in the first or last grid column, whose window the grid's edge
+// clips: the cell keeps a nonzero value, an empty one takes its largest neighbour value. Returns
+// whether an empty cell took a nonzero value.
+bool dilate_edge_cell(const uint8_t *above, const uint8_t *row, const uint8_t *below,
+                      size_t grid_width, size_t cx, uint8_t *out) {
+  uint8_t window = 0;
+  for (size_t x = cx > 0 ? cx - 1 : 0; x <= cx + 1 && x < grid_width; ++x) {
+    const uint8_t column = max3(above[x], row[x], below[x]);
+    window = column > window ? column : window;
+  }
+  const uint8_t cell = row[cx];
+  out[cx] = cell != 0 ? cell : window;
+  return cell == 0 && window != 0;
+}
 
-// One dilation pass: every empty cell of `current` with a filled neighbour receives, in `next`,
-// the largest neighbour value. It reads only `current`, so cells filled now feed nothing before
-// the next pass. Returns the number of cells filled.
-//
-// The largest value of an empty cell's clamped 3 x 3 window is its largest neighbour value (the
-// cell itself is 0). The window maximum is taken in two separable halves: rows of three into
-// `next`, then columns of three in place, one strip at a time, with the rows above carried on
-// the stack. Filled cells are then stored back from `current`, which `next` equals at the start
-// of every pass, so `next` ends exactly as if only the newly filled cells had been written; the
-// loops have no branches and vectorise.
-uint32_t dilate_once(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
-  if (grid_height == 0 || grid_width == 0) return 0;
+// One dilation pass: every empty cell of `current` with a filled neighbour takes, in `next`, its
+// largest neighbour value, and every other cell is copied, so `next` needs no earlier contents.
+// An empty cell is 0, so the largest value of its 3 x 3 window is its largest neighbour value;
+// the grid's first and last rows stand in for the missing rows beyond them. Returns whether a
+// cell was filled: the passes only ever ask whether their fill count is nonzero.
+bool dilate_once(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
+  bool filled = false;
   for (size_t cy = 0; cy < grid_height; ++cy) {
     const uint8_t *row = current + cy * grid_width;
+    const uint8_t *above = cy > 0 ? row - grid_width : row;
+    const uint8_t *below = cy + 1 < grid_height ? row + grid_width : row;
     uint8_t *out = next + cy * grid_width;
-    if (grid_width == 1) {
-      out[0] = row[0];
+    if (!holds(row, grid_width, 0)) {  // a full row is only copied
+      std::memcpy(out, row, grid_width);
       continue;
     }
-    out[0] = max3(row[0], row[0], row[1]);
-    for (size_t cx = 1; cx + 1 < grid_width; ++cx)
-      out[cx] = max3(row[cx - 1], row[cx], row[cx + 1]);
-    out[grid_width - 1] = max3(row[grid_width - 2], row[grid_width - 1], row[grid_width - 1]);
-  }
-
-  uint32_t filled = 0;
-  uint8_t above[kDilateStrip];
-  for (size_t start = 0; start < grid_width; start += kDilateStrip) {
-    const size_t count = grid_width - start < kDilateStrip ? grid_width - start : kDilateStrip;
-    std::memcpy(above, next + start, count);  // the first row is its own upper neighbour
-    for (size_t cy = 0; cy < grid_height; ++cy) {
-      uint8_t *row_maxima = next + cy * grid_width + start;
-      // The last row is its own lower neighbour: row_maxima[i] is read below before it is
-      // written.
-      const uint8_t *below = cy + 1 < grid_height ? row_maxima + grid_width : row_maxima;
-      const uint8_t *cells = current + cy * grid_width + start;
-      for (size_t i = 0; i < count; ++i) {
-        const uint8_t centre = row_maxima[i];
-        const uint8_t window = max3(above[i], centre, below[i]);
-        above[i] = centre;
-        const bool empty = cells[i] == 0;
-        filled += empty && window != 0 ? 1u : 0u;
-        row_maxima[i] = empty ? window : cells[i];
-      }
+    filled |= dilate_edge_cell(above, row, below, grid_width, 0, out);
+    if (grid_width > 1)
+      filled |= dilate_edge_cell(above, row, below, grid_width, grid_width - 1, out);
+    if (grid_width > 2) {
+      filled |= kel::simd::dilate_run(above + 1, row + 1, below + 1, grid_width - 2, out + 1);
     }
   }
   return filled;
 }
 
-// Spreads the gathered values until a pass fills nothing; `next` starts as a copy of `current`.
+// Spreads the gathered values until a pass fills nothing. Each pass reads one grid and writes
+// every cell of the other, so the two trade places instead of being copied; the passes fill
+// exactly what passes that copy `next` back into `current` fill. The result ends in `current`.
 void dilate_until_full(uint8_t *current, uint8_t *next, uint16_t grid_height, uint16_t grid_width) {
-  const size_t cells = size_t{grid_height} * grid_width;
-  std::memcpy(next, current, cells);
-  uint32_t filled = 0;
+  uint8_t *from = current;
+  uint8_t *to = next;
+  bool filled = false;
   do {
-    filled = dilate_once(current, next, grid_height, grid_width);
-    std::memcpy(current, next, cells);
-  } while (filled != 0);
+    filled = dilate_once(from, to, grid_height, grid_width);
+    uint8_t *const swap = from;
+    from = to;
+    to = swap;
+  } while (filled);
+  if (from != current) std::memcpy(current, from, size_t{grid_height} * grid_width);
 }
 
 // a * b bytes, or null when the product does not fit size_t or malloc fails. A zero-byte
@@ -422,18 +499,7 @@ void fill_masked(const uint8_t *src, uint16_t height, uint16_t width, const uint
   kel_scale_up_bilinear_uint8(scratch.current, grid_height, grid_width, kBlockSide,
                               scratch.enlarged, big_height, big_width);
 
-  // Every hole pixel, edge rows and columns included, takes the enlarged surface. Known pixels
-  // are stored back unchanged, which lets the loop run as vector selects.
-  for (size_t y = 0; y < height; ++y) {
-    const uint8_t *mask_row = mask + y * width;
-    const uint8_t *enlarged_row = scratch.enlarged + y * big_width;
-    uint8_t *dst_row = dst + y * width;
-    for (size_t x = 0; x < width; ++x) {
-      const uint8_t kept = dst_row[x];
-      dst_row[x] = is_hole(mask_row[x]) ? enlarged_row[x] : kept;
-    }
-  }
-
+  fill_holes(mask, height, width, scratch.enlarged, big_width, dst);
   kel_blur_uint8(dst, height, width, scratch.blurred);
   soften_seam(mask, height, width, scratch.blurred, dst);
 }
@@ -475,6 +541,24 @@ void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *o
     const uint8_t value = in[i];
     if (value != key) out[i] = blended(out[i], value);
   }
+}
+
+bool dilate_run(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
+                uint8_t *out) {
+  // The windows' left and right columns, which the caller guarantees are readable.
+  const uint8_t *above_left = above - 1, *row_left = row - 1, *below_left = below - 1;
+  const uint8_t *above_right = above + 1, *row_right = row + 1, *below_right = below + 1;
+  uint8_t filled = 0;
+  for (size_t i = 0; i < count; ++i) {
+    const uint8_t window =
+        max3(max3(above_left[i], row_left[i], below_left[i]), max3(above[i], row[i], below[i]),
+             max3(above_right[i], row_right[i], below_right[i]));
+    const uint8_t cell = row[i];
+    const bool empty = cell == 0;
+    filled |= static_cast<uint8_t>(empty & (window != 0));
+    out[i] = empty ? window : cell;
+  }
+  return filled != 0;
 }
 
 }  // namespace plain

@@ -66,12 +66,13 @@ Bytes model_fill(const Bytes &src, size_t height, size_t width, const Bytes &mas
   return dst;
 }
 
-// Random blobs, scattered holes and stripes, on sizes around the vector widths and the
-// 256-column pieces, with 0 and 255 among the source values and mask values other than 1.
+// Random blobs, scattered holes and stripes, on sizes around the vector widths, the 256-column
+// pieces and the 256-cell dilation strips, with 0 and 255 among the source values and mask
+// values other than 1.
 TEST(FillSpeedParity, FillMatchesThePerPixelModel) {
   std::mt19937 rng(5);
-  const std::pair<size_t, size_t> sizes[] = {{1, 1},   {2, 9},    {3, 3},    {9, 2},   {17, 33},
-                                             {40, 31}, {13, 257}, {21, 300}, {64, 515}};
+  const std::pair<size_t, size_t> sizes[] = {{1, 1},   {2, 9},    {3, 3},    {9, 2},    {17, 33},
+                                             {40, 31}, {13, 257}, {21, 300}, {64, 515}, {26, 2100}};
   for (const auto &[height, width] : sizes) {
     for (int pattern = 0; pattern < 4; ++pattern) {
       Bytes src(height * width), mask(height * width, 1);

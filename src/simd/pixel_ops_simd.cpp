@@ -114,6 +114,41 @@ void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out)
   plain::blend_row_with_key(in + done, count - done, key, out + done);
 }
 
+// The 3 x 3 window maximum from nine unaligned loads; an empty cell keeps it, a filled one its
+// own value. `fresh` lanes hold the values that empty cells took, to tell whether any was
+// nonzero. A cell's result depends on the inputs alone, so the last few cells are done by one
+// more vector that overlaps cells already done.
+bool DilateRun(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
+               uint8_t *out) {
+  bool filled = false;
+  const auto step = [&](auto d, size_t i) {
+    const auto column_max = [&](size_t at) {
+      return hn::Max(hn::Max(hn::LoadU(d, above + at), hn::LoadU(d, row + at)),
+                     hn::LoadU(d, below + at));
+    };
+    // Column i - 1 through i + 1: `row - 1` is readable, so index from there.
+    const auto window = hn::Max(hn::Max(column_max(i), column_max(i + 1)), column_max(i + 2));
+    const auto cell = hn::LoadU(d, row + 1 + i);
+    const auto empty = hn::Eq(cell, hn::Zero(d));
+    hn::StoreU(hn::IfThenElse(empty, window, cell), d, out + i);
+    const auto fresh = hn::IfThenElseZero(empty, window);
+    filled |= !hn::AllTrue(d, hn::Eq(fresh, hn::Zero(d)));
+  };
+  above -= 1;
+  row -= 1;
+  below -= 1;
+  const size_t done = for_each_vector(count, step);
+  const hn::CappedTag<uint8_t, 16> d16;
+  if (done == count) return filled;
+  if (count < hn::Lanes(d16)) {
+    return plain::dilate_run(above + 1 + done, row + 1 + done, below + 1 + done, count - done,
+                             out + done) ||
+           filled;
+  }
+  step(d16, count - hn::Lanes(d16));
+  return filled;
+}
+
 #else
 // The fallback target's variants are the plain loops.
 void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
@@ -134,6 +169,10 @@ void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out)
 void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   plain::blend_row_with_key(in, count, key, out);
 }
+bool DilateRun(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
+               uint8_t *out) {
+  return plain::dilate_run(above, row, below, count, out);
+}
 #endif  // KEL_PIXEL_OPS_VECTORS
 
 }  // namespace HWY_NAMESPACE
@@ -151,6 +190,7 @@ HWY_EXPORT(CopyRow);
 HWY_EXPORT(BlendRow);
 HWY_EXPORT(PasteRowWithKey);
 HWY_EXPORT(BlendRowWithKey);
+HWY_EXPORT(DilateRun);
 
 void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
   HWY_DYNAMIC_DISPATCH(BrightenRow)(in, count, percent, out);
@@ -169,6 +209,11 @@ void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *o
 }
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   HWY_DYNAMIC_DISPATCH(BlendRowWithKey)(in, count, key, out);
+}
+
+bool dilate_run(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
+                uint8_t *out) {
+  return HWY_DYNAMIC_DISPATCH(DilateRun)(above, row, below, count, out);
 }
 
 // Each row call through the dispatch asks the library for the chosen target again; a paste of

@@ -36,6 +36,14 @@ void blend_row(const uint8_t *in, size_t count, uint8_t *out);
 void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 
+// One dilation step of the masked fill over a run of block-grid cells whose left and right
+// neighbours exist: row[-1] and row[count] are readable, and likewise in `above` and `below`,
+// the rows above and below (or the row itself at the grid's edge). out[i] = row[i] where that
+// is nonzero; an empty cell takes the largest of its eight neighbours. Returns whether an
+// empty cell took a nonzero value. `out` must not overlap the three rows.
+bool dilate_run(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
+                uint8_t *out);
+
 inline CompositeRowLoops composite_row_loops() {
   return {copy_row, blend_row, paste_row_with_key, blend_row_with_key};
 }
@@ -51,6 +59,8 @@ void copy_row(const uint8_t *in, size_t count, uint8_t *out);
 void blend_row(const uint8_t *in, size_t count, uint8_t *out);
 void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+bool dilate_run(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
+                uint8_t *out);
 // The variants chosen for this machine.
 CompositeRowLoops composite_row_loops();
 #else
@@ -61,6 +71,7 @@ using plain::brighten_row;
 using plain::composite_row_loops;
 using plain::copy_row;
 using plain::darken_row;
+using plain::dilate_run;
 using plain::paste_row_with_key;
 #endif
 
