@@ -8,6 +8,8 @@
 #include <hwy/foreach_target.h>  // must come before highway.h
 #include <hwy/highway.h>
 
+#include <cstring>
+
 HWY_BEFORE_NAMESPACE();
 namespace kel {
 namespace simd {
@@ -20,31 +22,26 @@ namespace hn = hwy::HWY_NAMESPACE;
 using D8 = hn::ScalableTag<uint8_t>;
 
 #if KEL_PIXEL_OPS_VECTORS
-// floor(x / 100) for x up to 100 * 255 = 25500, as (x * 5243) >> 19: 5243 / 2^19 exceeds 1/100
-// by less than 1 / (100 * 25500), too little to carry any x past the next multiple of 100.
-// The test checks every percentage and pixel.
-template <class D16>
-hn::Vec<D16> hundredths(D16 d16, hn::Vec<D16> x) {
-  return hn::ShiftRight<3>(hn::MulHigh(x, hn::Set(d16, 5243)));
+// floor(percent * base / 100) for a base of at most 255 is (base * factor) >> 16 with
+// factor = ceil(percent * 2^16 / 100) when percent is below 100: factor / 2^16 exceeds
+// percent / 100 by less than 2^-16, which adds less than 255 / 2^16 < 0.004 to a quotient whose
+// fraction is at most 0.99, so no quotient reaches the next integer. One high-half multiply so
+// replaces the product and the division. 100 percent (factor 2^16) does not fit 16 bits; the
+// rows take it apart. The test checks every percentage and pixel.
+uint16_t percent_factor(uint16_t percent) {
+  return static_cast<uint16_t>((uint32_t{percent} * 65536 + 99) / 100);
 }
 
 // floor(percent * base / 100) of every byte, in 16-bit lanes: the even bytes, then the odd
 // ones, put back in place. kComplement takes 255 - byte as the base.
 template <bool kComplement, class D>
-hn::Vec<D> change(D d, hn::Vec<D> pixels, uint16_t percent) {
+hn::Vec<D> change(D d, hn::Vec<D> pixels, uint16_t factor) {
   const hn::Repartition<uint16_t, D> d16;
   using V16 = hn::Vec<decltype(d16)>;
-  const V16 low_bytes = hn::Set(d16, 0x00FF);
-  const V16 words = hn::BitCast(d16, pixels);
-  V16 even = hn::And(words, low_bytes);
-  V16 odd = hn::ShiftRight<8>(words);
-  if (kComplement) {
-    even = hn::Sub(low_bytes, even);
-    odd = hn::Sub(low_bytes, odd);
-  }
-  const V16 p = hn::Set(d16, percent);
-  const V16 even_change = hundredths(d16, hn::Mul(even, p));
-  const V16 odd_change = hundredths(d16, hn::Mul(odd, p));
+  const V16 words = hn::BitCast(d16, kComplement ? hn::Not(pixels) : pixels);
+  const V16 f = hn::Set(d16, factor);
+  const V16 even_change = hn::MulHigh(hn::And(words, hn::Set(d16, 0x00FF)), f);
+  const V16 odd_change = hn::MulHigh(hn::ShiftRight<8>(words), f);
   return hn::BitCast(d, hn::Or(even_change, hn::ShiftLeft<8>(odd_change)));
 }
 
@@ -66,18 +63,29 @@ size_t for_each_vector(size_t count, Step step) {
   return i;
 }
 
+// At 100 percent every pixel moves the whole way, to 255 or to 0.
 void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  if (percent >= 100) {
+    std::memset(out, 255, count);
+    return;
+  }
+  const uint16_t factor = percent_factor(percent);
   const size_t done = for_each_vector(count, [&](auto d, size_t i) {
     const auto pixels = hn::LoadU(d, in + i);
-    hn::StoreU(hn::Add(pixels, change<true>(d, pixels, percent)), d, out + i);
+    hn::StoreU(hn::Add(pixels, change<true>(d, pixels, factor)), d, out + i);
   });
   plain::brighten_row(in + done, count - done, percent, out + done);
 }
 
 void DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  if (percent >= 100) {
+    std::memset(out, 0, count);
+    return;
+  }
+  const uint16_t factor = percent_factor(percent);
   const size_t done = for_each_vector(count, [&](auto d, size_t i) {
     const auto pixels = hn::LoadU(d, in + i);
-    hn::StoreU(hn::Sub(pixels, change<false>(d, pixels, percent)), d, out + i);
+    hn::StoreU(hn::Sub(pixels, change<false>(d, pixels, factor)), d, out + i);
   });
   plain::darken_row(in + done, count - done, percent, out + done);
 }
