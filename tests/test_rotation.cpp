@@ -10,10 +10,7 @@
 
 #include "kel_images.h"
 #include "kel_outside.h"
-
-#if KEL_USE_HIGHWAY
-#include <hwy/targets.h>
-#endif
+#include "test_support.h"
 
 // The "cannot allocate" test asks malloc for 2^62 bytes; under AddressSanitizer that must come
 // back as null, as it does from the C library, instead of aborting.
@@ -254,21 +251,7 @@ TEST(Rotation, HalfwayBetweenColumnsTruncatesTowardZero) {
   }
 }
 
-// Runs `check` once for every vector variant compiled in and supported by this machine, each
-// forced in turn; once without them.
-template <typename Check>
-void for_each_variant(Check check) {
-#if KEL_USE_HIGHWAY
-  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
-    SCOPED_TRACE(hwy::TargetName(target));
-    hwy::SetSupportedTargetsForTest(target);
-    check();
-  }
-  hwy::SetSupportedTargetsForTest(0);
-#else
-  check();
-#endif
-}
+using kel_test::for_each_variant;
 
 // The routines step positions along each row, skip the uncovered runs and hand long runs to
 // the vector variants; every canvas must equal the plain per-pixel mapping, at every angle, for

@@ -6,6 +6,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstdio>
 #include <random>
 #include <vector>
 
@@ -13,19 +14,38 @@
 #include "simd/pixel_ops_simd.h"
 #include "simd/rotation_simd.h"
 #include "simd/statistics_simd.h"
+#include "test_support.h"
+
+#if defined(HWY_COMPILE_ONLY_STATIC)
+#include <hwy/highway.h>
+
+// The baseline's copy kernel, which a build with Highway's headers alone calls directly.
+namespace kel {
+namespace simd {
+namespace HWY_NAMESPACE {
+void CopyRow(const uint8_t *in, size_t count, uint8_t *out);
+}  // namespace HWY_NAMESPACE
+}  // namespace simd
+}  // namespace kel
+#endif
 
 namespace {
 
 using Bytes = std::vector<uint8_t>;
+using kel_test::for_each_variant;
 
-template <typename Check>
-void for_each_target(Check check) {
-  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
-    SCOPED_TRACE(hwy::TargetName(target));
-    hwy::SetSupportedTargetsForTest(target);
-    check();
-  }
-  hwy::SetSupportedTargetsForTest(0);
+// The library's calls reach the kernels of a vector instruction set, not the one-lane fallback,
+// which hands its work to the plain loops.
+TEST(SimdParity, TheLibraryCallsVectorKernels) {
+#if defined(HWY_COMPILE_ONLY_STATIC)
+  const int64_t target = HWY_STATIC_TARGET;
+  EXPECT_EQ(kel::simd::composite_row_loops().copy, &kel::simd::HWY_NAMESPACE::CopyRow);
+#else
+  const int64_t target = hwy::SupportedAndGeneratedTargets().front();
+#endif
+  std::printf("vector kernels: %s\n", hwy::TargetName(target));
+  EXPECT_NE(target, HWY_SCALAR);
+  EXPECT_NE(target, HWY_EMU128);
 }
 
 // Lengths around every vector size and the byte counters' 255-vector limit, and some random
@@ -50,7 +70,7 @@ std::vector<Bytes> rows_of(size_t length, std::mt19937 &rng) {
 
 TEST(SimdParity, HistogramsOfUpToSixteenBins) {
   std::mt19937 rng(11);
-  for_each_target([&] {
+  for_each_variant([&] {
     for (const size_t length : row_lengths(rng)) {
       for (const Bytes &row : rows_of(length, rng)) {
         for (uint32_t bits = 0; bits <= kel::kMostVectorBinBits; ++bits) {
@@ -69,7 +89,7 @@ TEST(SimdParity, PixelSumsWrapLikeThePlainSums) {
   std::mt19937 rng(12);
   // 17,000,000 pixels of 255 wrap both sums, the squares many times over.
   const Bytes bright(17000001, 255);
-  for_each_target([&] {
+  for_each_variant([&] {
     for (const size_t length : row_lengths(rng)) {
       for (const Bytes &row : rows_of(length, rng)) {
         const auto count = static_cast<uint32_t>(length);
@@ -97,7 +117,7 @@ TEST(SimdParity, ImageVarianceEqualsTheHistogramStatistics) {
   Bytes extremes(16843010 + 1);  // the mean sum wraps just past 16843009 pixels of 255
   for (size_t i = 0; i < extremes.size(); ++i) extremes[i] = i % 5 ? 255 : 0;
   images.push_back(extremes);
-  for_each_target([&] {
+  for_each_variant([&] {
     for (const Bytes &image : images) {
       const auto width = static_cast<int32_t>(image.size() - 1);
       uint32_t hist[256];
@@ -115,7 +135,7 @@ TEST(SimdParity, ImageVarianceEqualsTheHistogramStatistics) {
 TEST(SimdParity, BrightenAndDarkenEveryPercentageAndPixel) {
   Bytes all_values(1 + 256 * 3);
   for (size_t i = 1; i < all_values.size(); ++i) all_values[i] = static_cast<uint8_t>(i * 7);
-  for_each_target([&] {
+  for_each_variant([&] {
     for (uint16_t percent = 0; percent <= 100; ++percent) {
       for (const size_t length : {size_t{256 * 3}, size_t{200}, size_t{5}}) {
         Bytes expected(length), actual(length);
@@ -139,7 +159,7 @@ TEST(SimdParity, BrightenAndDarkenEveryPercentageAndPixel) {
 // starts before its source in the same buffer, which the vector variants may read ahead on.
 TEST(SimdParity, PasteAndBlendRows) {
   std::mt19937 rng(14);
-  for_each_target([&] {
+  for_each_variant([&] {
     for (const size_t length : row_lengths(rng)) {
       for (const Bytes &source : rows_of(length, rng)) {
         Bytes target(length + 1);
@@ -185,7 +205,7 @@ TEST(SimdParity, PasteAndBlendRows) {
 // the run fills some cells and not others, and rows that are all empty or all full.
 TEST(SimdParity, DilationRuns) {
   std::mt19937 rng(15);
-  for_each_target([&] {
+  for_each_variant([&] {
     for (const size_t length : row_lengths(rng)) {
       for (const int density : {0, 1, 8, 100}) {  // percent of filled cells
         Bytes rows(3 * (length + 2));
@@ -213,7 +233,7 @@ TEST(SimdParity, SignedRotationTruncatesTowardZeroAtTheLastUnit) {
   std::vector<int8_t> source(8 * 8, -1);
   source[1 * 8 + 1] = 0;
   const kel::simd::RotationRow run{source.data(), 8, 8, 1, 1, 0, 0, 64};
-  for_each_target([&] {
+  for_each_variant([&] {
     std::vector<int8_t> out(64, 99);
     const size_t done = kel::simd::rotate_row_bilinear(run, out.data());
     for (size_t i = 0; i < done; ++i) ASSERT_EQ(out[i], 0) << i;

@@ -1,6 +1,8 @@
 // Helpers shared by the test programs: seeded random rasters, rasters with guard bytes, rasters
-// as rows of characters, and the pixel classes of the masked fill.
+// as rows of characters, the pixel classes of the masked fill, and a run of every vector variant.
 #pragma once
+
+#include <gtest/gtest.h>
 
 #include <algorithm>
 #include <cstddef>
@@ -8,6 +10,10 @@
 #include <random>
 #include <string>
 #include <vector>
+
+#if KEL_USE_HIGHWAY
+#include <hwy/targets.h>
+#endif
 
 namespace kel_test {
 
@@ -78,5 +84,25 @@ struct Mask {
   bool border(int x, int y) const { return !hole(x, y) && interior(x, y) && next_to(x, y, true); }
   bool seam(int x, int y) const { return hole(x, y) && interior(x, y) && next_to(x, y, false); }
 };
+
+// Runs `check` once for every vector variant compiled in that this machine runs, each forced in
+// turn. A build with Highway's headers alone has one variant, the baseline's, which the library
+// calls directly; without Highway the plain loops run, once.
+template <typename Check>
+void for_each_variant(Check check) {
+#if KEL_USE_HIGHWAY && !defined(HWY_COMPILE_ONLY_STATIC)
+  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
+    SCOPED_TRACE(hwy::TargetName(target));
+    hwy::SetSupportedTargetsForTest(target);
+    check();
+  }
+  hwy::SetSupportedTargetsForTest(0);
+#else
+#if KEL_USE_HIGHWAY
+  SCOPED_TRACE(hwy::TargetName(HWY_STATIC_TARGET));
+#endif
+  check();
+#endif
+}
 
 }  // namespace kel_test
