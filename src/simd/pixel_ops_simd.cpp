@@ -225,8 +225,11 @@ bool dilate_run(const uint8_t *above, const uint8_t *row, const uint8_t *below, 
 }
 
 // Each row call through the dispatch asks the library for the chosen target again; a paste of
-// a few hundred short rows takes the three pointers once instead.
+// a few hundred short rows takes the three pointers once instead. Until the first dispatched
+// call has chosen a target the table holds the choosing stubs, so one empty call goes first.
 CompositeRowLoops composite_row_loops() {
+  uint8_t nothing = 0;
+  HWY_DYNAMIC_DISPATCH(CopyRow)(&nothing, 0, &nothing);
   return {&HWY_DYNAMIC_DISPATCH(CopyRow), &HWY_DYNAMIC_DISPATCH(BlendRow),
           &HWY_DYNAMIC_DISPATCH(PasteRowWithKey), &HWY_DYNAMIC_DISPATCH(BlendRowWithKey)};
 }
