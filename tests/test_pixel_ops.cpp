@@ -1,7 +1,9 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <array>
 #include <cstdint>
+#include <random>
 #include <string>
 #include <utility>
 #include <vector>
@@ -275,35 +277,57 @@ TEST(DefaultBlur, ImpulseGivesTheBinomialKernel) {
   // clang-format on
 }
 
-// The documented kernel: [1 2 1] / 4 along the rows, then along the columns, each pass rounded
-// half up, edges repeated; in place and out of place, for widths around the 256-column strip and
-// single rows and columns.
-TEST(DefaultBlur, MatchesTheDocumentedKernelInAndOutOfPlace) {
-  const std::pair<int, int> kSizes[] = {{1, 1},   {1, 300}, {300, 1}, {7, 255},
-                                        {7, 256}, {7, 257}, {5, 513}, {33, 600}};
-  for (const auto &[height, width] : kSizes) {
-    SCOPED_TRACE(testing::Message() << height << " x " << width);
-    const Bytes in = random_bytes(size_t(height) * width, uint32_t(width));
-    const auto at = [](const Bytes &raster, int stride, int x, int y) {
-      return raster[size_t(y) * stride + x];
+// Random pictures of four kinds: any values, only 0 and 255, only the top values, only the
+// bottom ones; the kind and the values follow from the seed.
+Bytes random_picture(size_t count, uint32_t seed) {
+  const int kinds[4][2] = {{0, 255}, {0, 1}, {250, 255}, {0, 3}};
+  const auto &kind = kinds[seed % 4];
+  Bytes picture = random_bytes(count, seed, kind[0], kind[1]);
+  if (seed % 4 == 1) {
+    for (uint8_t &p : picture) p = static_cast<uint8_t>(p * 255);
+  }
+  return picture;
+}
+
+// The documented blur, pixel by pixel: [1 2 1] / 4 along the rows, then along the columns, each
+// pass rounded half up, edges repeated.
+Bytes documented_blur(const Bytes &in, int height, int width) {
+  const auto pass = [height, width](const Bytes &from, int dx, int dy) {
+    const auto at = [&](int x, int y) {
+      return int{from[size_t(std::clamp(y, 0, height - 1)) * width + std::clamp(x, 0, width - 1)]};
     };
-    Bytes rows(in.size()), expected(in.size()), out(in.size()), in_place = in;
-    for (int i = 0; i < int(in.size()); ++i) {
+    Bytes to(from.size());
+    for (int i = 0; i < int(from.size()); ++i) {
       const int x = i % width, y = i / width;
-      rows[i] = uint8_t((at(in, width, std::max(x - 1, 0), y) + 2 * in[i] +
-                         at(in, width, std::min(x + 1, width - 1), y) + 2) >>
-                        2);
+      to[i] = uint8_t((at(x - dx, y - dy) + 2 * at(x, y) + at(x + dx, y + dy) + 2) >> 2);
     }
-    for (int i = 0; i < int(in.size()); ++i) {
-      const int x = i % width, y = i / width;
-      expected[i] = uint8_t((at(rows, width, x, std::max(y - 1, 0)) + 2 * rows[i] +
-                             at(rows, width, x, std::min(y + 1, height - 1)) + 2) >>
-                            2);
-    }
+    return to;
+  };
+  return pass(pass(in, 1, 0), 0, 1);
+}
+
+// The vector loops against the documented kernel, in place and apart, on single rows and
+// columns, widths around the 256-column strips and many random sizes whose sides are not
+// multiples of any vector; nothing outside the output is written.
+TEST(DefaultBlur, MatchesTheDocumentedKernelInAndOutOfPlace) {
+  std::vector<std::pair<int, int>> sizes = {{1, 1},   {1, 2},   {2, 1},   {2, 2},
+                                            {1, 300}, {300, 1}, {7, 255}, {7, 256},
+                                            {7, 257}, {5, 513}, {33, 600}};
+  std::mt19937 rng(3);
+  std::uniform_int_distribution<int> side(1, 70);
+  for (int i = 0; i < 200; ++i) sizes.emplace_back(side(rng), side(rng));
+  for (const auto &[height, width] : sizes) {
+    SCOPED_TRACE(testing::Message() << height << " x " << width);
+    const size_t count = size_t(height) * width;
+    const Bytes in = random_picture(count, uint32_t(count + sizes.size()));
+    kel_test::Guarded out(count, 0xAA), in_place(count, 0);
+    std::copy(in.begin(), in.end(), in_place.data());
     kel_blur_uint8(in.data(), uint16_t(height), uint16_t(width), out.data());
     kel_blur_uint8(in_place.data(), uint16_t(height), uint16_t(width), in_place.data());
-    EXPECT_EQ(out, expected);
-    EXPECT_EQ(in_place, expected);
+    const Bytes expected = documented_blur(in, height, width);
+    ASSERT_EQ(out.inside(), expected);
+    ASSERT_EQ(in_place.inside(), expected);
+    ASSERT_TRUE(out.guards_intact() && in_place.guards_intact());
   }
   kel_blur_uint8(nullptr, 0, 5, nullptr);
   kel_blur_uint8(nullptr, 5, 0, nullptr);
@@ -332,25 +356,52 @@ uint8_t documented_scale(const Bytes &in, int in_height, int in_width, int facto
   return static_cast<uint8_t>((upper * (256 - r.weight) + lower * r.weight + 32768) >> 16);
 }
 
-// Every output pixel is written (outputs prefilled with 0 and with 255 agree), also beyond the
-// input's enlarged size.
+// Every output pixel is written as documented (outputs prefilled with 0 and with 255 agree) and
+// nothing beyond it: outputs of the enlarged size, larger (the edge repeats), smaller, and far
+// wider than the enlarged input, which leaves whole strips of columns beyond the last sample.
+// The factor 8, the fill's, has loops of its own; it takes most of the random cases.
 TEST(DefaultScale, WritesEveryPixelAsDocumented) {
-  const uint16_t kCases[][5] = {{3, 4, 8, 24, 32},   {5, 300, 8, 40, 2400}, {7, 9, 3, 23, 29},
-                                {4, 200, 1, 4, 200}, {6, 5, 2, 14, 13},     {2, 3, 5, 10, 15},
-                                {3, 4, 8, 30, 40},   {1, 1, 8, 8, 8},       {2, 2, 1, 9, 9},
-                                {0, 4, 8, 3, 5},     {4, 0, 8, 3, 5},       {4, 4, 0, 3, 5},
-                                {4, 4, 3, 5, 5}};
-  for (const auto &c : kCases) {
-    SCOPED_TRACE(testing::Message() << c[0] << " x " << c[1] << " by " << c[2]);
-    const Bytes in = random_bytes(size_t{c[0]} * c[1] + 1, c[2]);
-    Bytes expected(size_t{c[3]} * c[4]), low(expected.size(), 0), high(expected.size(), 255);
-    for (size_t i = 0; i < expected.size(); ++i) {
+  std::vector<std::array<int, 5>> cases = {
+      {3, 4, 8, 24, 32}, {5, 300, 8, 40, 2400}, {7, 9, 3, 23, 29}, {4, 200, 1, 4, 200},
+      {6, 5, 2, 14, 13}, {2, 3, 5, 10, 15},     {3, 4, 8, 30, 40}, {1, 1, 8, 8, 8},
+      {2, 2, 1, 9, 9},   {0, 4, 8, 3, 5},       {4, 0, 8, 3, 5},   {4, 4, 0, 3, 5},
+      {4, 4, 3, 5, 5},   {1, 2, 8, 3, 900},     {2, 1, 8, 9, 5},   {33, 70, 8, 264, 560}};
+  std::mt19937 rng(4);
+  std::uniform_int_distribution<int> side(1, 40), more(0, 11), wide(300, 700);
+  const int kFactors[] = {8, 8, 8, 8, 1, 2, 3, 4, 7, 16};
+  for (int i = 0; i < 120; ++i) {
+    const int h = side(rng), w = side(rng), f = kFactors[i % 10];
+    switch (i % 4) {
+      case 0:
+        cases.push_back({h, w, f, h * f, w * f});
+        break;
+      case 1:
+        cases.push_back({h, w, f, h * f + more(rng), w * f + more(rng)});
+        break;
+      case 2:
+        cases.push_back({h, w, f, std::max(h * f - more(rng), 1), side(rng)});
+        break;
+      default:
+        cases.push_back({h, w, f, more(rng) + 1, w * f + wide(rng)});
+        break;
+    }
+  }
+  for (const auto &c : cases) {
+    SCOPED_TRACE(testing::Message()
+                 << c[0] << " x " << c[1] << " by " << c[2] << " into " << c[3] << " x " << c[4]);
+    const Bytes in = random_picture(size_t(c[0]) * c[1] + 1, uint32_t(c[2] + c[4]));
+    const size_t count = size_t(c[3]) * c[4];
+    Bytes expected(count);
+    for (size_t i = 0; i < count; ++i) {
       expected[i] = documented_scale(in, c[0], c[1], c[2], int(i % c[4]), int(i / c[4]));
     }
-    kel_scale_up_bilinear_uint8(in.data(), c[0], c[1], c[2], low.data(), c[3], c[4]);
-    kel_scale_up_bilinear_uint8(in.data(), c[0], c[1], c[2], high.data(), c[3], c[4]);
-    EXPECT_EQ(low, expected);
-    EXPECT_EQ(high, expected);
+    for (const uint8_t fill : {uint8_t{0}, uint8_t{255}}) {
+      kel_test::Guarded out(count, fill);
+      kel_scale_up_bilinear_uint8(in.data(), uint16_t(c[0]), uint16_t(c[1]), uint16_t(c[2]),
+                                  out.data(), uint16_t(c[3]), uint16_t(c[4]));
+      ASSERT_EQ(out.inside(), expected);
+      ASSERT_TRUE(out.guards_intact());
+    }
   }
   kel_scale_up_bilinear_uint8(nullptr, 0, 0, 8, nullptr, 0, 0);
 }

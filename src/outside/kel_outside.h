@@ -29,11 +29,12 @@ KEL_OUTSIDE_API int32_t tq_sin_(uint8_t angle);
  * rounded down. The statistics call it with v << 18 and take (r >> 2) as floor(sqrt(v)). */
 KEL_OUTSIDE_API uint32_t tq_sqrt_24_5(uint32_t x);
 
-/* Smooths the height x width raster `in` into `out` (same size, row stride width). The masked
- * fill relies on it working in place (in == out) and accepting zero sizes.
+/* Smooths the height x width raster `in` into `out` (same size, row stride width), which is
+ * either `in` itself or a raster that does not overlap it. The masked fill relies on it working
+ * in place (in == out) and accepting zero sizes.
  * Ours: a 3 x 3 binomial blur, [1 2 1] / 4 along the rows and then along the columns, each pass
  * rounding half up ((a + 2b + c + 2) >> 2) and repeating the edge pixels beyond the border. A
- * constant raster stays constant. No heap; about 0.5 KiB of stack. */
+ * constant raster stays constant. No heap; under 1 KiB of stack. */
 KEL_OUTSIDE_API void kel_blur_uint8(const uint8_t *in, uint16_t height, uint16_t width,
                                     uint8_t *out);
 
@@ -44,7 +45,7 @@ KEL_OUTSIDE_API void kel_blur_uint8(const uint8_t *in, uint16_t height, uint16_t
  * (i + 1/2) / factor - 1/2; positions before the first or after the last input sample take that
  * sample, which also covers an output larger than input * factor. Weights carry 8 fraction bits
  * (rounded down); the result, 16 fraction bits, is rounded half up. An empty input or a factor
- * of 0 gives an all-0 output. No heap; about 2.5 KiB of stack. */
+ * of 0 gives an all-0 output. No heap; about 3 KiB of stack. */
 KEL_OUTSIDE_API void kel_scale_up_bilinear_uint8(const uint8_t *in, uint16_t in_height,
                                                  uint16_t in_width, uint16_t factor, uint8_t *out,
                                                  uint16_t out_height, uint16_t out_width);
