@@ -391,47 +391,6 @@ void soften_seam(const uint8_t *mask, uint16_t height, uint16_t width, const uin
       });
 }
 
-// The dilation step of a cell in the first or last grid column, whose window the grid's edge
-// clips: the cell keeps a nonzero value, an empty one takes its largest neighbour value. Returns
-// whether an empty cell took a nonzero value.
-bool dilate_edge_cell(const uint8_t *above, const uint8_t *row, const uint8_t *below,
-                      size_t grid_width, size_t cx, uint8_t *out) {
-  uint8_t window = 0;
-  for (size_t x = cx > 0 ? cx - 1 : 0; x <= cx + 1 && x < grid_width; ++x) {
-    const uint8_t column = max3(above[x], row[x], below[x]);
-    window = column > window ? column : window;
-  }
-  const uint8_t cell = row[cx];
-  out[cx] = cell != 0 ? cell : window;
-  return cell == 0 && window != 0;
-}
-
-// One dilation pass: every empty cell of `current` with a filled neighbour takes, in `next`, its
-// largest neighbour value, and every other cell is copied, so `next` needs no earlier contents.
-// An empty cell is 0, so the largest value of its 3 x 3 window is its largest neighbour value;
-// the grid's first and last rows stand in for the missing rows beyond them. Returns whether a
-// cell was filled: the passes only ever ask whether their fill count is nonzero.
-bool dilate_once(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
-  bool filled = false;
-  for (size_t cy = 0; cy < grid_height; ++cy) {
-    const uint8_t *row = current + cy * grid_width;
-    const uint8_t *above = cy > 0 ? row - grid_width : row;
-    const uint8_t *below = cy + 1 < grid_height ? row + grid_width : row;
-    uint8_t *out = next + cy * grid_width;
-    if (!holds(row, grid_width, 0)) {  // a full row is only copied
-      std::memcpy(out, row, grid_width);
-      continue;
-    }
-    filled |= dilate_edge_cell(above, row, below, grid_width, 0, out);
-    if (grid_width > 1)
-      filled |= dilate_edge_cell(above, row, below, grid_width, grid_width - 1, out);
-    if (grid_width > 2) {
-      filled |= kel::simd::dilate_run(above + 1, row + 1, below + 1, grid_width - 2, out + 1);
-    }
-  }
-  return filled;
-}
-
 // Spreads the gathered values until a pass fills nothing. Each pass reads one grid and writes
 // every cell of the other, so the two trade places instead of being copied; the passes fill
 // exactly what passes that copy `next` back into `current` fill. The result ends in `current`.
@@ -440,7 +399,7 @@ void dilate_until_full(uint8_t *current, uint8_t *next, uint16_t grid_height, ui
   uint8_t *to = next;
   bool filled = false;
   do {
-    filled = dilate_once(from, to, grid_height, grid_width);
+    filled = kel::simd::dilate_pass(from, to, grid_height, grid_width);
     uint8_t *const swap = from;
     from = to;
     to = swap;
@@ -541,6 +500,47 @@ void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *o
     const uint8_t value = in[i];
     if (value != key) out[i] = blended(out[i], value);
   }
+}
+
+// An empty cell is 0, so the largest value of its 3 x 3 window is its largest neighbour value;
+// the grid's first and last rows stand in for the missing rows beyond them. A full row is only
+// copied.
+bool dilate_pass(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
+  bool filled = false;
+  for (size_t cy = 0; cy < grid_height; ++cy) {
+    const uint8_t *row = current + cy * grid_width;
+    const uint8_t *above = cy > 0 ? row - grid_width : row;
+    const uint8_t *below = cy + 1 < grid_height ? row + grid_width : row;
+    uint8_t *out = next + cy * grid_width;
+    if (!holds(row, grid_width, 0)) {
+      std::memcpy(out, row, grid_width);
+      continue;
+    }
+    filled |= dilate_row_ends(above, row, below, grid_width, out);
+    if (grid_width > 2)
+      filled |= dilate_run(above + 1, row + 1, below + 1, grid_width - 2, out + 1);
+  }
+  return filled;
+}
+
+// The window of an edge cell is clipped to the columns that exist.
+bool dilate_row_ends(const uint8_t *above, const uint8_t *row, const uint8_t *below,
+                     size_t grid_width, uint8_t *out) {
+  bool filled = false;
+  if (grid_width == 0) return filled;
+  const size_t ends[] = {0, grid_width - 1};
+  for (size_t e = 0; e < (grid_width > 1 ? 2 : 1); ++e) {
+    const size_t cx = ends[e];
+    uint8_t window = 0;
+    for (size_t x = cx > 0 ? cx - 1 : 0; x <= cx + 1 && x < grid_width; ++x) {
+      const uint8_t column = max3(above[x], row[x], below[x]);
+      window = column > window ? column : window;
+    }
+    const uint8_t cell = row[cx];
+    out[cx] = cell != 0 ? cell : window;
+    filled |= cell == 0 && window != 0;
+  }
+  return filled;
 }
 
 bool dilate_run(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,

@@ -201,33 +201,28 @@ TEST(SimdParity, PasteAndBlendRows) {
   });
 }
 
-// Three grid rows with a readable column either side: sparse values among empty cells, where
-// the run fills some cells and not others, and rows that are all empty or all full.
-TEST(SimdParity, DilationRuns) {
+// Whole passes over grids of every shape from one cell up, with sparse values among empty
+// cells, where a pass fills some cells and not others, and grids that are all empty or all full.
+TEST(SimdParity, DilationPasses) {
   std::mt19937 rng(15);
   for_each_variant([&] {
-    for (const size_t length : row_lengths(rng)) {
-      for (const int density : {0, 1, 8, 100}) {  // percent of filled cells
-        Bytes rows(3 * (length + 2));
-        for (uint8_t &cell : rows) {
-          cell =
-              static_cast<int>(rng() % 100) < density ? static_cast<uint8_t>(1 + rng() % 255) : 0;
-        }
-        const uint8_t *above = rows.data() + 1, *row = above + length + 2,
-                      *below = row + length + 2;
-        Bytes expected(length + 1, 7), actual(length + 1, 7);
-        const bool expected_filled =
-            kel::plain::dilate_run(above, row, below, length, expected.data());
-        const bool actual_filled = kel::simd::dilate_run(above, row, below, length, actual.data());
-        ASSERT_EQ(actual, expected) << "length " << length << ", density " << density;
-        ASSERT_EQ(actual_filled, expected_filled) << "length " << length << ", density " << density;
+    for (int trial = 0; trial < 300; ++trial) {
+      const size_t height = 1 + rng() % 9, width = trial < 100 ? 1 + trial : 1 + rng() % 600;
+      const int density = trial % 4 == 0 ? 0 : trial % 4 == 1 ? 100 : static_cast<int>(rng() % 20);
+      Bytes grid(height * width);
+      for (uint8_t &cell : grid) {
+        cell = static_cast<int>(rng() % 100) < density ? static_cast<uint8_t>(1 + rng() % 255) : 0;
       }
+      Bytes expected(grid.size(), 7), actual(grid.size(), 7);
+      const bool expected_filled =
+          kel::plain::dilate_pass(grid.data(), expected.data(), height, width);
+      const bool actual_filled = kel::simd::dilate_pass(grid.data(), actual.data(), height, width);
+      ASSERT_EQ(actual, expected) << height << " x " << width << ", density " << density;
+      ASSERT_EQ(actual_filled, expected_filled) << height << " x " << width;
     }
   });
 }
 
-// Sampled positions rarely land on a bilinear total just above a multiple of 2^28, where
-// truncating toward zero and rounding down differ by the last unit. Neighbours -1, -1, -1, 0 at
 // fractions 1/16384 give exactly -2^28 + 1, which must become 0.
 TEST(SimdParity, SignedRotationTruncatesTowardZeroAtTheLastUnit) {
   std::vector<int8_t> source(8 * 8, -1);

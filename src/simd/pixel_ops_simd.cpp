@@ -157,6 +157,20 @@ bool DilateRun(const uint8_t *above, const uint8_t *row, const uint8_t *below, s
   return filled;
 }
 
+// A whole pass in one call: the grid's rows are short, so the dispatch stays out of the row loop.
+bool DilatePass(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
+  bool filled = false;
+  for (size_t cy = 0; cy < grid_height; ++cy) {
+    const uint8_t *row = current + cy * grid_width;
+    const uint8_t *above = cy > 0 ? row - grid_width : row;
+    const uint8_t *below = cy + 1 < grid_height ? row + grid_width : row;
+    uint8_t *out = next + cy * grid_width;
+    filled |= plain::dilate_row_ends(above, row, below, grid_width, out);
+    if (grid_width > 2) filled |= DilateRun(above + 1, row + 1, below + 1, grid_width - 2, out + 1);
+  }
+  return filled;
+}
+
 #else
 // The fallback target's variants are the plain loops.
 void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
@@ -177,9 +191,8 @@ void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out)
 void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   plain::blend_row_with_key(in, count, key, out);
 }
-bool DilateRun(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
-               uint8_t *out) {
-  return plain::dilate_run(above, row, below, count, out);
+bool DilatePass(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
+  return plain::dilate_pass(current, next, grid_height, grid_width);
 }
 #endif  // KEL_PIXEL_OPS_VECTORS
 
@@ -198,7 +211,7 @@ HWY_EXPORT(CopyRow);
 HWY_EXPORT(BlendRow);
 HWY_EXPORT(PasteRowWithKey);
 HWY_EXPORT(BlendRowWithKey);
-HWY_EXPORT(DilateRun);
+HWY_EXPORT(DilatePass);
 
 void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
   HWY_DYNAMIC_DISPATCH(BrightenRow)(in, count, percent, out);
@@ -219,9 +232,8 @@ void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *o
   HWY_DYNAMIC_DISPATCH(BlendRowWithKey)(in, count, key, out);
 }
 
-bool dilate_run(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
-                uint8_t *out) {
-  return HWY_DYNAMIC_DISPATCH(DilateRun)(above, row, below, count, out);
+bool dilate_pass(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
+  return HWY_DYNAMIC_DISPATCH(DilatePass)(current, next, grid_height, grid_width);
 }
 
 // Each row call through the dispatch asks the library for the chosen target again; a paste of
