@@ -391,20 +391,56 @@ void soften_seam(const uint8_t *mask, uint16_t height, uint16_t width, const uin
       });
 }
 
-// Spreads the gathered values until a pass fills nothing. Each pass reads one grid and writes
-// every cell of the other, so the two trade places instead of being copied; the passes fill
-// exactly what passes that copy `next` back into `current` fill. The result ends in `current`.
-void dilate_until_full(uint8_t *current, uint8_t *next, uint16_t grid_height, uint16_t grid_width) {
-  uint8_t *from = current;
-  uint8_t *to = next;
-  bool filled = false;
-  do {
-    filled = kel::simd::dilate_pass(from, to, grid_height, grid_width);
-    uint8_t *const swap = from;
-    from = to;
-    to = swap;
-  } while (filled);
-  if (from != current) std::memcpy(current, from, size_t{grid_height} * grid_width);
+// The dilation passes, computed in two sweeps. A pass fills the empty cells next to cells
+// filled before it, each with the largest of those neighbours' values, and a filled cell never
+// changes; so a cell is filled by the pass numbered by its chessboard distance
+// (max(|dx|, |dy|)) to the nearest gathered cell, and takes the largest value among the
+// gathered cells at that distance: stepping from it toward any of them one cell at a time
+// reaches a cell filled one pass earlier that holds that one among its own. Every cell thus
+// ends with the smallest key 256 * distance + (255 - value) over the gathered cells, as 255 -
+// value is below 256. Distance is a shortest path of king's moves, and each such path can be
+// laid out as moves down and rightward followed by moves up and leftward; so a sweep from the
+// top that takes each row's upper neighbours and then its left neighbour, and one from the
+// bottom that takes the lower neighbours and then the right one, find every key. An empty grid
+// stays empty, as the passes leave it.
+constexpr uint32_t kKeyStep = 256;                  // one cell of distance
+constexpr uint32_t kUnreached = uint32_t{1} << 31;  // no path can grow it past 2^32
+
+uint32_t min_key(uint32_t a, uint32_t b) {
+  return a < b ? a : b;
+}
+
+// Each key of `row` takes its three neighbours in the finished row `from`, one step on.
+void take_from_row(const uint32_t *from, uint32_t *row, size_t grid_width) {
+  if (grid_width == 1) {
+    row[0] = min_key(row[0], from[0] + kKeyStep);
+    return;
+  }
+  row[0] = min_key(row[0], min_key(from[0], from[1]) + kKeyStep);
+  for (size_t x = 1; x + 1 < grid_width; ++x) {
+    row[x] = min_key(row[x], min_key(min_key(from[x - 1], from[x]), from[x + 1]) + kKeyStep);
+  }
+  const size_t last = grid_width - 1;
+  row[last] = min_key(row[last], min_key(from[last - 1], from[last]) + kKeyStep);
+}
+
+// Fills every cell reachable from a gathered one; `keys` is scratch for one key per cell.
+void dilate_until_full(uint8_t *grid, uint16_t grid_height, uint16_t grid_width, uint32_t *keys) {
+  const size_t cells = size_t{grid_height} * grid_width;
+  for (size_t i = 0; i < cells; ++i) keys[i] = grid[i] != 0 ? 255u - grid[i] : kUnreached;
+  for (size_t cy = 0; cy < grid_height; ++cy) {
+    uint32_t *row = keys + cy * grid_width;
+    if (cy > 0) take_from_row(row - grid_width, row, grid_width);
+    for (size_t x = 1; x < grid_width; ++x) row[x] = min_key(row[x], row[x - 1] + kKeyStep);
+  }
+  for (size_t cy = grid_height; cy-- > 0;) {
+    uint32_t *row = keys + cy * grid_width;
+    if (cy + 1 < grid_height) take_from_row(row + grid_width, row, grid_width);
+    for (size_t x = grid_width; x-- > 1;) row[x - 1] = min_key(row[x - 1], row[x] + kKeyStep);
+  }
+  for (size_t i = 0; i < cells; ++i) {
+    grid[i] = keys[i] >= kUnreached ? 0 : static_cast<uint8_t>(255 - (keys[i] & 255));
+  }
 }
 
 // a * b bytes, or null when the product does not fit size_t or malloc fails. A zero-byte
@@ -415,7 +451,8 @@ uint8_t *allocate_bytes(size_t a, size_t b) {
   return static_cast<uint8_t *>(std::malloc(bytes != 0 ? bytes : 1));
 }
 
-// The four scratch buffers of one fill, taken in this order and released together.
+// The four scratch buffers of one fill, taken in this order and released together, as hosts that
+// count or fail allocations expect. The sweeps need no second grid, so `next` stays unused.
 struct FillScratch {
   uint8_t *enlarged = nullptr;
   uint8_t *current = nullptr;
@@ -452,7 +489,10 @@ void fill_masked(const uint8_t *src, uint16_t height, uint16_t width, const uint
   if (dst != src && pixels != 0) std::memcpy(dst, src, pixels);
   std::memset(scratch.current, 0, size_t{grid_height} * grid_width);
   gather_edge_values(src, mask, height, width, scratch.current, grid_width);
-  dilate_until_full(scratch.current, scratch.next, grid_height, grid_width);
+  // The enlarged raster, 64 bytes per cell, is not needed until the enlargement writes it: it
+  // holds the sweeps' keys meanwhile.
+  dilate_until_full(scratch.current, grid_height, grid_width,
+                    reinterpret_cast<uint32_t *>(scratch.enlarged));
 
   kel_blur_uint8(scratch.current, grid_height, grid_width, scratch.current);
   kel_scale_up_bilinear_uint8(scratch.current, grid_height, grid_width, kBlockSide,
@@ -500,65 +540,6 @@ void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *o
     const uint8_t value = in[i];
     if (value != key) out[i] = blended(out[i], value);
   }
-}
-
-// An empty cell is 0, so the largest value of its 3 x 3 window is its largest neighbour value;
-// the grid's first and last rows stand in for the missing rows beyond them. A full row is only
-// copied.
-bool dilate_pass(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
-  bool filled = false;
-  for (size_t cy = 0; cy < grid_height; ++cy) {
-    const uint8_t *row = current + cy * grid_width;
-    const uint8_t *above = cy > 0 ? row - grid_width : row;
-    const uint8_t *below = cy + 1 < grid_height ? row + grid_width : row;
-    uint8_t *out = next + cy * grid_width;
-    if (!holds(row, grid_width, 0)) {
-      std::memcpy(out, row, grid_width);
-      continue;
-    }
-    filled |= dilate_row_ends(above, row, below, grid_width, out);
-    if (grid_width > 2)
-      filled |= dilate_run(above + 1, row + 1, below + 1, grid_width - 2, out + 1);
-  }
-  return filled;
-}
-
-// The window of an edge cell is clipped to the columns that exist.
-bool dilate_row_ends(const uint8_t *above, const uint8_t *row, const uint8_t *below,
-                     size_t grid_width, uint8_t *out) {
-  bool filled = false;
-  if (grid_width == 0) return filled;
-  const size_t ends[] = {0, grid_width - 1};
-  for (size_t e = 0; e < (grid_width > 1 ? 2 : 1); ++e) {
-    const size_t cx = ends[e];
-    uint8_t window = 0;
-    for (size_t x = cx > 0 ? cx - 1 : 0; x <= cx + 1 && x < grid_width; ++x) {
-      const uint8_t column = max3(above[x], row[x], below[x]);
-      window = column > window ? column : window;
-    }
-    const uint8_t cell = row[cx];
-    out[cx] = cell != 0 ? cell : window;
-    filled |= cell == 0 && window != 0;
-  }
-  return filled;
-}
-
-bool dilate_run(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
-                uint8_t *out) {
-  // The windows' left and right columns, which the caller guarantees are readable.
-  const uint8_t *above_left = above - 1, *row_left = row - 1, *below_left = below - 1;
-  const uint8_t *above_right = above + 1, *row_right = row + 1, *below_right = below + 1;
-  uint8_t filled = 0;
-  for (size_t i = 0; i < count; ++i) {
-    const uint8_t window =
-        max3(max3(above_left[i], row_left[i], below_left[i]), max3(above[i], row[i], below[i]),
-             max3(above_right[i], row_right[i], below_right[i]));
-    const uint8_t cell = row[i];
-    const bool empty = cell == 0;
-    filled |= static_cast<uint8_t>(empty & (window != 0));
-    out[i] = empty ? window : cell;
-  }
-  return filled != 0;
 }
 
 }  // namespace plain

@@ -271,6 +271,20 @@ TEST(FillCalls, GridIsGatheredAndDilated) {
     const Picture p = random_picture(uint16_t(17 + seed * 5), uint16_t(40 - seed * 3), seed);
     EXPECT_EQ(grid_reaching_blur(p), expected_grid(p)) << "random " << seed;
   }
+  // A few cells far apart on wide and tall grids, their values from a short list so that fronts
+  // of different values meet at equal distances all over the grid.
+  std::mt19937 rng(3);
+  for (int trial = 0; trial < 40; ++trial) {
+    const auto height = static_cast<uint16_t>(8 + rng() % 300);
+    const auto width = static_cast<uint16_t>(8 + rng() % 300);
+    Picture p = blank_picture(height, width);
+    for (int seeds = 1 + static_cast<int>(rng() % 6); seeds > 0; --seeds) {
+      seed_cell(p, 3 + static_cast<int>(rng() % (width - 6u)),
+                3 + static_cast<int>(rng() % (height - 6u)),
+                static_cast<uint8_t>(40 * (1 + rng() % 3)));
+    }
+    EXPECT_EQ(grid_reaching_blur(p), expected_grid(p)) << "sparse " << trial;
+  }
 }
 
 }  // namespace

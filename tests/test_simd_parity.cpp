@@ -201,28 +201,6 @@ TEST(SimdParity, PasteAndBlendRows) {
   });
 }
 
-// Whole passes over grids of every shape from one cell up, with sparse values among empty
-// cells, where a pass fills some cells and not others, and grids that are all empty or all full.
-TEST(SimdParity, DilationPasses) {
-  std::mt19937 rng(15);
-  for_each_variant([&] {
-    for (int trial = 0; trial < 300; ++trial) {
-      const size_t height = 1 + rng() % 9, width = trial < 100 ? 1 + trial : 1 + rng() % 600;
-      const int density = trial % 4 == 0 ? 0 : trial % 4 == 1 ? 100 : static_cast<int>(rng() % 20);
-      Bytes grid(height * width);
-      for (uint8_t &cell : grid) {
-        cell = static_cast<int>(rng() % 100) < density ? static_cast<uint8_t>(1 + rng() % 255) : 0;
-      }
-      Bytes expected(grid.size(), 7), actual(grid.size(), 7);
-      const bool expected_filled =
-          kel::plain::dilate_pass(grid.data(), expected.data(), height, width);
-      const bool actual_filled = kel::simd::dilate_pass(grid.data(), actual.data(), height, width);
-      ASSERT_EQ(actual, expected) << height << " x " << width << ", density " << density;
-      ASSERT_EQ(actual_filled, expected_filled) << height << " x " << width;
-    }
-  });
-}
-
 // fractions 1/16384 give exactly -2^28 + 1, which must become 0.
 TEST(SimdParity, SignedRotationTruncatesTowardZeroAtTheLastUnit) {
   std::vector<int8_t> source(8 * 8, -1);

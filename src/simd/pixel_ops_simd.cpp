@@ -122,55 +122,6 @@ void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out)
   plain::blend_row_with_key(in + done, count - done, key, out + done);
 }
 
-// The 3 x 3 window maximum from nine unaligned loads; an empty cell keeps it, a filled one its
-// own value. `fresh` lanes hold the values that empty cells took, to tell whether any was
-// nonzero. A cell's result depends on the inputs alone, so the last few cells are done by one
-// more vector that overlaps cells already done.
-bool DilateRun(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
-               uint8_t *out) {
-  bool filled = false;
-  const auto step = [&](auto d, size_t i) {
-    const auto column_max = [&](size_t at) {
-      return hn::Max(hn::Max(hn::LoadU(d, above + at), hn::LoadU(d, row + at)),
-                     hn::LoadU(d, below + at));
-    };
-    // Column i - 1 through i + 1: `row - 1` is readable, so index from there.
-    const auto window = hn::Max(hn::Max(column_max(i), column_max(i + 1)), column_max(i + 2));
-    const auto cell = hn::LoadU(d, row + 1 + i);
-    const auto empty = hn::Eq(cell, hn::Zero(d));
-    hn::StoreU(hn::IfThenElse(empty, window, cell), d, out + i);
-    const auto fresh = hn::IfThenElseZero(empty, window);
-    filled |= !hn::AllTrue(d, hn::Eq(fresh, hn::Zero(d)));
-  };
-  above -= 1;
-  row -= 1;
-  below -= 1;
-  const size_t done = for_each_vector(count, step);
-  const hn::CappedTag<uint8_t, 16> d16;
-  if (done == count) return filled;
-  if (count < hn::Lanes(d16)) {
-    return plain::dilate_run(above + 1 + done, row + 1 + done, below + 1 + done, count - done,
-                             out + done) ||
-           filled;
-  }
-  step(d16, count - hn::Lanes(d16));
-  return filled;
-}
-
-// A whole pass in one call: the grid's rows are short, so the dispatch stays out of the row loop.
-bool DilatePass(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
-  bool filled = false;
-  for (size_t cy = 0; cy < grid_height; ++cy) {
-    const uint8_t *row = current + cy * grid_width;
-    const uint8_t *above = cy > 0 ? row - grid_width : row;
-    const uint8_t *below = cy + 1 < grid_height ? row + grid_width : row;
-    uint8_t *out = next + cy * grid_width;
-    filled |= plain::dilate_row_ends(above, row, below, grid_width, out);
-    if (grid_width > 2) filled |= DilateRun(above + 1, row + 1, below + 1, grid_width - 2, out + 1);
-  }
-  return filled;
-}
-
 #else
 // The fallback target's variants are the plain loops.
 void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
@@ -191,9 +142,6 @@ void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out)
 void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   plain::blend_row_with_key(in, count, key, out);
 }
-bool DilatePass(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
-  return plain::dilate_pass(current, next, grid_height, grid_width);
-}
 #endif  // KEL_PIXEL_OPS_VECTORS
 
 }  // namespace HWY_NAMESPACE
@@ -211,7 +159,6 @@ HWY_EXPORT(CopyRow);
 HWY_EXPORT(BlendRow);
 HWY_EXPORT(PasteRowWithKey);
 HWY_EXPORT(BlendRowWithKey);
-HWY_EXPORT(DilatePass);
 
 void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
   HWY_DYNAMIC_DISPATCH(BrightenRow)(in, count, percent, out);
@@ -230,10 +177,6 @@ void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *o
 }
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   HWY_DYNAMIC_DISPATCH(BlendRowWithKey)(in, count, key, out);
-}
-
-bool dilate_pass(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width) {
-  return HWY_DYNAMIC_DISPATCH(DilatePass)(current, next, grid_height, grid_width);
 }
 
 // Each row call through the dispatch asks the library for the chosen target again; a paste of

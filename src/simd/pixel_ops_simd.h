@@ -36,22 +36,6 @@ void blend_row(const uint8_t *in, size_t count, uint8_t *out);
 void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 
-// One dilation pass of the masked fill over a block grid of grid_height x grid_width cells:
-// every cell of `next` takes the cell of `current`, except that an empty (0) cell takes the
-// largest value of its eight neighbours inside the grid. Returns whether an empty cell took a
-// nonzero value. The grids must not overlap.
-bool dilate_pass(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width);
-
-// The pass over one grid row's first and last cell, whose windows the grid's edge clips;
-// `above` and `below` are the rows around it, or the row itself at the grid's top and bottom.
-bool dilate_row_ends(const uint8_t *above, const uint8_t *row, const uint8_t *below,
-                     size_t grid_width, uint8_t *out);
-
-// The pass over count cells whose left and right neighbours exist: row[-1] and row[count] are
-// readable, and likewise in `above` and `below`.
-bool dilate_run(const uint8_t *above, const uint8_t *row, const uint8_t *below, size_t count,
-                uint8_t *out);
-
 inline CompositeRowLoops composite_row_loops() {
   return {copy_row, blend_row, paste_row_with_key, blend_row_with_key};
 }
@@ -67,7 +51,6 @@ void copy_row(const uint8_t *in, size_t count, uint8_t *out);
 void blend_row(const uint8_t *in, size_t count, uint8_t *out);
 void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
-bool dilate_pass(const uint8_t *current, uint8_t *next, size_t grid_height, size_t grid_width);
 // The variants chosen for this machine.
 CompositeRowLoops composite_row_loops();
 #else
@@ -78,7 +61,6 @@ using plain::brighten_row;
 using plain::composite_row_loops;
 using plain::copy_row;
 using plain::darken_row;
-using plain::dilate_pass;
 using plain::paste_row_with_key;
 #endif
 
