@@ -427,6 +427,7 @@ void take_from_row(const uint32_t *from, uint32_t *row, size_t grid_width) {
 // Fills every cell reachable from a gathered one; `keys` is scratch for one key per cell.
 void dilate_until_full(uint8_t *grid, uint16_t grid_height, uint16_t grid_width, uint32_t *keys) {
   const size_t cells = size_t{grid_height} * grid_width;
+  if (cells == 0) return;  // rows of no cells, or no rows
   for (size_t i = 0; i < cells; ++i) keys[i] = grid[i] != 0 ? 255u - grid[i] : kUnreached;
   for (size_t cy = 0; cy < grid_height; ++cy) {
     uint32_t *row = keys + cy * grid_width;
