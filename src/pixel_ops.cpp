@@ -217,16 +217,12 @@ ColumnRange merged(ColumnRange a, ColumnRange b) {
 }
 
 // Most mask rows hold no hole, and those that do hold it in a short stretch: memchr finds the
-// first hole at memory speed, and the last is sought backwards a block at a time.
+// first hole at memory speed, and the last is sought backwards from the row's end.
 ColumnRange hole_columns(const uint8_t *mask_row, size_t width) {
   const void *first_hole = width != 0 ? std::memchr(mask_row, 0, width) : nullptr;
   if (first_hole == nullptr) return {};
   const size_t first = static_cast<size_t>(static_cast<const uint8_t *>(first_hole) - mask_row);
-  constexpr size_t kBlock = 64;
-  size_t end = width;
-  while (end - first > kBlock && !holds(mask_row + end - kBlock, kBlock, 0)) end -= kBlock;
-  while (mask_row[end - 1] != 0) --end;  // stops at `first` at the latest
-  return {first, end};
+  return {first, first + kel::simd::end_of_last_zero(mask_row + first, width - first)};
 }
 
 // Interior columns classified together; a piece's windows take about 1 KiB of stack.
@@ -541,6 +537,15 @@ void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *o
     const uint8_t value = in[i];
     if (value != key) out[i] = blended(out[i], value);
   }
+}
+
+// Backwards a block at a time while the blocks hold no zero, then byte by byte.
+size_t end_of_last_zero(const uint8_t *bytes, size_t count) {
+  constexpr size_t kBlock = 64;
+  size_t end = count;
+  while (end > kBlock && !holds(bytes + end - kBlock, kBlock, 0)) end -= kBlock;
+  while (end > 0 && bytes[end - 1] != 0) --end;
+  return end;
 }
 
 }  // namespace plain

@@ -122,6 +122,18 @@ void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out)
   plain::blend_row_with_key(in + done, count - done, key, out + done);
 }
 
+// Whole vectors from the end while they hold no zero; the plain loop finds the byte in the
+// vector that does.
+size_t EndOfLastZero(const uint8_t *bytes, size_t count) {
+  const D8 d;
+  size_t end = count;
+  while (end >= hn::Lanes(d) &&
+         hn::AllFalse(d, hn::Eq(hn::LoadU(d, bytes + end - hn::Lanes(d)), hn::Zero(d)))) {
+    end -= hn::Lanes(d);
+  }
+  return plain::end_of_last_zero(bytes, end);
+}
+
 #else
 // The fallback target's variants are the plain loops.
 void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
@@ -142,6 +154,9 @@ void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out)
 void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   plain::blend_row_with_key(in, count, key, out);
 }
+size_t EndOfLastZero(const uint8_t *bytes, size_t count) {
+  return plain::end_of_last_zero(bytes, count);
+}
 #endif  // KEL_PIXEL_OPS_VECTORS
 
 }  // namespace HWY_NAMESPACE
@@ -159,6 +174,7 @@ HWY_EXPORT(CopyRow);
 HWY_EXPORT(BlendRow);
 HWY_EXPORT(PasteRowWithKey);
 HWY_EXPORT(BlendRowWithKey);
+HWY_EXPORT(EndOfLastZero);
 
 void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
   HWY_DYNAMIC_DISPATCH(BrightenRow)(in, count, percent, out);
@@ -177,6 +193,10 @@ void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *o
 }
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   HWY_DYNAMIC_DISPATCH(BlendRowWithKey)(in, count, key, out);
+}
+
+size_t end_of_last_zero(const uint8_t *bytes, size_t count) {
+  return HWY_DYNAMIC_DISPATCH(EndOfLastZero)(bytes, count);
 }
 
 // Each row call through the dispatch asks the library for the chosen target again; a paste of

@@ -36,6 +36,9 @@ void blend_row(const uint8_t *in, size_t count, uint8_t *out);
 void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 
+// One past the last zero byte of bytes[0 .. count), or 0 when there is none.
+size_t end_of_last_zero(const uint8_t *bytes, size_t count);
+
 inline CompositeRowLoops composite_row_loops() {
   return {copy_row, blend_row, paste_row_with_key, blend_row_with_key};
 }
@@ -51,6 +54,7 @@ void copy_row(const uint8_t *in, size_t count, uint8_t *out);
 void blend_row(const uint8_t *in, size_t count, uint8_t *out);
 void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t end_of_last_zero(const uint8_t *bytes, size_t count);
 // The variants chosen for this machine.
 CompositeRowLoops composite_row_loops();
 #else
@@ -61,6 +65,7 @@ using plain::brighten_row;
 using plain::composite_row_loops;
 using plain::copy_row;
 using plain::darken_row;
+using plain::end_of_last_zero;
 using plain::paste_row_with_key;
 #endif
 
