@@ -8,10 +8,12 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstdio>
+#include <iterator>
 #include <random>
 #include <vector>
 
 #include "kel_images.h"
+#include "outside/image_filters_simd.h"
 #include "simd/pixel_ops_simd.h"
 #include "simd/rotation_simd.h"
 #include "simd/statistics_simd.h"
@@ -198,6 +200,64 @@ TEST(SimdParity, PasteAndBlendRows) {
               << length << " key " << int{key};
         }
       }
+    }
+  });
+}
+
+// Our default blur and enlargement on the vector loops against the plain ones, on random sizes
+// and on pictures of random pixels or of only 0 and 255, the largest steps between neighbours.
+Bytes random_picture(size_t count, std::mt19937 &rng) {
+  Bytes picture(count);
+  const bool extremes = rng() % 2 != 0;
+  for (uint8_t &p : picture) p = static_cast<uint8_t>(extremes ? (rng() % 2) * 255 : rng());
+  return picture;
+}
+
+TEST(SimdParity, BlurApartAndInPlace) {
+  std::mt19937 rng(15);
+  std::uniform_int_distribution<int> side(1, 300);
+  for_each_variant([&] {
+    const kel::outside::FilterLoops plain = kel::outside::plain::filter_loops();
+    const kel::outside::FilterLoops vector = kel::outside::simd::filter_loops();
+    for (int i = 0; i < 40; ++i) {
+      const auto height = static_cast<uint16_t>(i < 3 ? i + 1 : side(rng));
+      const auto width = static_cast<uint16_t>(i < 3 ? 3 - i : side(rng));
+      const Bytes in = random_picture(size_t{height} * width, rng);
+      Bytes expected(in.size(), 7), actual(in.size(), 7);
+      kel::outside::blur(plain, in.data(), height, width, expected.data());
+      kel::outside::blur(vector, in.data(), height, width, actual.data());
+      ASSERT_EQ(actual, expected) << height << " x " << width;
+      actual = in;
+      kel::outside::blur(vector, actual.data(), height, width, actual.data());
+      ASSERT_EQ(actual, expected) << height << " x " << width << " in place";
+    }
+  });
+}
+
+// Factor 8 (the masked fill's), the factors whose weights are whole sixteenths and others;
+// outputs up to a few pixels short of and well past the enlarged input, over several strips.
+TEST(SimdParity, ScaleUpByFactors) {
+  std::mt19937 rng(16);
+  std::uniform_int_distribution<int> side(1, 60);
+  std::uniform_int_distribution<int> beyond(-12, 40);
+  const uint16_t factors[] = {8, 8, 8, 8, 1, 2, 3, 4, 5, 16};
+  for_each_variant([&] {
+    const kel::outside::FilterLoops plain = kel::outside::plain::filter_loops();
+    const kel::outside::FilterLoops vector = kel::outside::simd::filter_loops();
+    for (int i = 0; i < 40; ++i) {
+      const uint16_t factor = factors[size_t(i) % std::size(factors)];
+      const auto in_height = static_cast<uint16_t>(side(rng));
+      const auto in_width = static_cast<uint16_t>(side(rng));
+      const auto out_height = static_cast<uint16_t>(std::max(1, in_height * factor + beyond(rng)));
+      const auto out_width = static_cast<uint16_t>(std::max(1, in_width * factor + beyond(rng)));
+      const Bytes in = random_picture(size_t{in_height} * in_width, rng);
+      Bytes expected(size_t{out_height} * out_width, 7), actual(expected);
+      kel::outside::scale_up_bilinear(plain, in.data(), in_height, in_width, factor,
+                                      expected.data(), out_height, out_width);
+      kel::outside::scale_up_bilinear(vector, in.data(), in_height, in_width, factor, actual.data(),
+                                      out_height, out_width);
+      ASSERT_EQ(actual, expected) << in_height << " x " << in_width << " by " << factor << " to "
+                                  << out_height << " x " << out_width;
     }
   });
 }

@@ -1,16 +1,20 @@
 // Our default smoothing and bilinear enlargement, the two image functions the masked fill
 // calls outside the library. Both work without heap and with a small, fixed amount of stack.
 //
-// The loops are plain C++ written so that GCC's vectoriser (-O3, as in the Release build) turns
-// them into vector code on its own, 8-bit averages for the blur and 16-bit lanes for the
-// enlargement, with SSE2 on any x86-64 and NEON on aarch64. That keeps this target one source
-// for every processor, free of any vector library.
+// The row loops are plain C++ written so that GCC's vectoriser (-O3, as in the Release build)
+// turns them into vector code on its own, 8-bit averages for the blur and 16-bit lanes for the
+// enlargement, with SSE2 on any x86-64 and NEON on aarch64. With Highway, image_filters_simd.cpp
+// has variants of them for wider instruction sets, picked at run time; the drivers here take
+// either set, and the plain loops are the reference the variants are tested against.
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
 
+#include "image_filters_simd.h"
 #include "kel_outside.h"
 
+namespace kel {
+namespace outside {
 namespace {
 
 size_t strip_length(size_t start, size_t total, size_t strip) {
@@ -35,16 +39,38 @@ uint8_t smooth(uint8_t before, uint8_t centre, uint8_t after) {
   return static_cast<uint8_t>((unsigned{outer} + centre + 1) >> 1);
 }
 
-// dst[i] = smooth(src[i], src[i + 1], src[i + 2]); dst does not overlap src.
+}  // namespace
+
+namespace plain {
+
 void smooth_triples(const uint8_t *src, size_t count, uint8_t *dst) {
   for (size_t i = 0; i < count; ++i) dst[i] = smooth(src[i], src[i + 1], src[i + 2]);
 }
 
-// The vertical pass of one row: `upper` holds the row above and receives the result, which
-// each column computes from its own three values only.
-void smooth_down(uint8_t *upper, const uint8_t *centre, const uint8_t *lower, size_t count) {
-  for (size_t i = 0; i < count; ++i) upper[i] = smooth(upper[i], centre[i], lower[i]);
+// Both passes of one row: the horizontal pass of `row` goes to `lower`, and the vertical pass
+// of `centre`'s column turns `upper` (the pass of the row above) into the result; each column
+// needs its own three values only.
+void smooth_across_and_down(const uint8_t *row, size_t count, uint8_t *upper, const uint8_t *centre,
+                            uint8_t *lower) {
+  for (size_t i = 0; i < count; ++i) {
+    const uint8_t across = smooth(row[i], row[i + 1], row[i + 2]);
+    lower[i] = across;
+    upper[i] = smooth(upper[i], centre[i], across);
+  }
 }
+
+// The vertical pass in place: `above` holds the original row above and takes this row's.
+void smooth_down_carrying(uint8_t *above, uint8_t *row, const uint8_t *below, size_t count) {
+  for (size_t i = 0; i < count; ++i) {
+    const uint8_t centre = row[i];
+    row[i] = smooth(above[i], centre, below[i]);
+    above[i] = centre;
+  }
+}
+
+}  // namespace plain
+
+namespace {
 
 // The horizontal pass of one row, handed column by column to `column(x, smoothed)`; the first
 // and last columns are their own outer neighbours.
@@ -55,20 +81,38 @@ void across_row(const uint8_t *row, size_t width, Column column) {
   if (width > 1) column(width - 1, smooth(row[width - 2], row[width - 1], row[width - 1]));
 }
 
+// The same pass into `out`, which does not overlap `row`, its inner columns on `loops`.
+void smooth_row(const FilterLoops &loops, const uint8_t *row, size_t width, uint8_t *out) {
+  out[0] = smooth(row[0], row[0], row[width > 1 ? 1 : 0]);
+  if (width > 2) loops.smooth_triples(row, width - 2, out + 1);
+  if (width > 1) out[width - 1] = smooth(row[width - 2], row[width - 1], row[width - 1]);
+}
+
 // From `in` into a separate `out`, both passes in one sweep down the image, so that every row
 // is read once from memory and the rows in use stay in the cache. The horizontal pass of input
 // row k is kept in output row k + 1 until that row is written: output row k + 1 is its last
 // reader, and as each output pixel needs only the passes in its own column, the output row can
 // replace the pass it reads pixel by pixel.
-void blur_apart(const uint8_t *in, size_t height, size_t width, uint8_t *out) {
-  across_row(in, width, [out](size_t x, uint8_t h) { out[x] = h; });
+void blur_apart(const FilterLoops &loops, const uint8_t *in, size_t height, size_t width,
+                uint8_t *out) {
+  smooth_row(loops, in, width, out);
   if (height == 1) return;               // the row is its own upper and lower neighbour
   std::memcpy(out + width, out, width);  // row 0 is its own upper neighbour
   for (size_t y = 0; y + 2 < height; ++y) {
     uint8_t *const upper = out + y * width;
     uint8_t *const lower = upper + 2 * width;
-    across_row(in + (y + 1) * width, width, [lower](size_t x, uint8_t h) { lower[x] = h; });
-    smooth_down(upper, upper + width, lower, width);
+    const auto down = [upper, lower, width](size_t x, uint8_t h) {
+      lower[x] = h;
+      upper[x] = smooth(upper[x], upper[width + x], h);
+    };
+    const uint8_t *const row = in + (y + 1) * width;
+    if (width > 2) {  // the inner columns in one call, the edges around them
+      loops.smooth_across_and_down(row, width - 2, upper + 1, upper + width + 1, lower + 1);
+      down(0, smooth(row[0], row[0], row[1]));
+      down(width - 1, smooth(row[width - 2], row[width - 1], row[width - 1]));
+    } else {
+      across_row(row, width, down);
+    }
   }
   // The last input row has no output row to wait in: its pass finishes both last output rows,
   // the last one being its own lower neighbour.
@@ -84,7 +128,7 @@ void blur_apart(const uint8_t *in, size_t height, size_t width, uint8_t *out) {
 // In place: the horizontal pass row by row, each strip copied to the stack before it is
 // overwritten, its last original byte carried on as the next strip's left neighbour; then the
 // vertical pass strip by strip down the columns, the original row above carried on the stack.
-void blur_in_place(uint8_t *pixels, size_t height, size_t width) {
+void blur_in_place(const FilterLoops &loops, uint8_t *pixels, size_t height, size_t width) {
   uint8_t window[kBlurStrip + 2];
   for (size_t y = 0; y < height; ++y) {
     uint8_t *row = pixels + y * width;
@@ -96,7 +140,7 @@ void blur_in_place(uint8_t *pixels, size_t height, size_t width) {
       // The byte after the strip is not written yet; past the last column the edge repeats.
       window[count + 1] = start + count < width ? row[start + count] : window[count];
       left = window[count];
-      smooth_triples(window, count, row + start);
+      loops.smooth_triples(window, count, row + start);
     }
   }
   uint8_t above[kBlurStrip];
@@ -107,11 +151,7 @@ void blur_in_place(uint8_t *pixels, size_t height, size_t width) {
       uint8_t *const row = pixels + y * width + start;
       // The last row is its own lower neighbour: row[i] is read below before it is written.
       const uint8_t *const below = y + 1 < height ? row + width : row;
-      for (size_t i = 0; i < count; ++i) {
-        const uint8_t centre = row[i];
-        row[i] = smooth(above[i], centre, below[i]);
-        above[i] = centre;
-      }
+      loops.smooth_down_carrying(above, row, below, count);
     }
   }
 }
@@ -183,6 +223,10 @@ bool weights_are_coarse(uint16_t factor) {
   return factor != 0 && 8 % factor == 0;
 }
 
+}  // namespace
+
+namespace plain {
+
 void blend_rows_coarse(const uint16_t *top, const uint16_t *bottom, uint32_t weight_bottom,
                        size_t count, uint8_t *out) {
   const auto bottom_part = static_cast<uint16_t>(weight_bottom >> kCoarseShift);
@@ -193,11 +237,16 @@ void blend_rows_coarse(const uint16_t *top, const uint16_t *bottom, uint32_t wei
   }
 }
 
+}  // namespace plain
+
+namespace {
+
 // Any factor, strip by strip: the sample positions of a strip's columns are found once, and
 // each input row is blended along them once for all the output rows between it and its
 // neighbours.
-void scale_up_any(const uint8_t *in, uint16_t in_height, uint16_t in_width, uint16_t factor,
-                  uint8_t *out, uint16_t out_height, uint16_t out_width) {
+void scale_up_any(const FilterLoops &loops, const uint8_t *in, uint16_t in_height,
+                  uint16_t in_width, uint16_t factor, uint8_t *out, uint16_t out_height,
+                  uint16_t out_width) {
   const bool coarse = weights_are_coarse(factor);
   const unsigned shift = coarse ? kCoarseShift : 0;
   Tap columns[kScaleStrip];
@@ -227,7 +276,7 @@ void scale_up_any(const uint8_t *in, uint16_t in_height, uint16_t in_width, uint
       }
       uint8_t *out_row = out + y * out_width + start;
       if (coarse) {
-        blend_rows_coarse(top, bottom, row.weight_second, count, out_row);
+        loops.blend_rows_coarse(top, bottom, row.weight_second, count, out_row);
       } else {
         blend_rows(top, bottom, row.weight_second, count, out_row);
       }
@@ -254,8 +303,8 @@ constexpr size_t kScale8Strip = 256;
 // k = first_run - 1 .. first_run + runs - 1, so output column 8 * first_run + i is pairs[i + 4].
 // Each sample is first spread over 8 bytes, so that the blend reads its two samples at fixed
 // distances with weights that repeat every 8 columns.
-void blend_row_by_8(const uint8_t *row, size_t width, size_t first_run, size_t runs,
-                    const uint8_t *odd, uint16_t *pairs) {
+void blend_row_by_8(const FilterLoops &loops, const uint8_t *row, size_t width, size_t first_run,
+                    size_t runs, const uint8_t *odd, uint16_t *pairs) {
   uint8_t spread[kScale8Strip + 16];  // samples first_run - 1 .. first_run + runs, 8 times each
   const size_t count = runs + 2;
   // Spread run i holds sample first_run - 1 + i: row[0] before the row (runs below `inside`),
@@ -269,7 +318,15 @@ void blend_row_by_8(const uint8_t *row, size_t width, size_t first_run, size_t r
     for (size_t j = 0; j < 8; ++j) spread[8 * i + j] = sample;
   }
   for (size_t i = past; i < count; ++i) std::memset(spread + 8 * i, row[width - 1], 8);
-  for (size_t x = 0; x < 8 * (runs + 1); ++x) {
+  loops.blend_spread(spread, odd, 8 * (runs + 1), pairs);
+}
+
+}  // namespace
+
+namespace plain {
+
+void blend_spread(const uint8_t *spread, const uint8_t *odd, size_t count, uint16_t *pairs) {
+  for (size_t x = 0; x < count; ++x) {
     pairs[x] = static_cast<uint16_t>(16 * spread[x] + odd[x] * (spread[x + 8] - spread[x]));
   }
 }
@@ -299,8 +356,12 @@ void mix_eight_rows(const uint16_t *upper, const uint16_t *lower, size_t count, 
   }
 }
 
-void scale_up_by_8(const uint8_t *in, size_t in_height, size_t in_width, uint8_t *out,
-                   size_t out_height, size_t out_width) {
+}  // namespace plain
+
+namespace {
+
+void scale_up_by_8(const FilterLoops &loops, const uint8_t *in, size_t in_height, size_t in_width,
+                   uint8_t *out, size_t out_height, size_t out_width) {
   uint16_t pairs[2][kScale8Strip + 8];
   uint8_t odd[kScale8Strip + 8];  // 2j + 1 for column 8q + j
   for (size_t x = 0; x < kScale8Strip + 8; ++x) odd[x] = static_cast<uint8_t>(2 * (x % 8) + 1);
@@ -308,7 +369,7 @@ void scale_up_by_8(const uint8_t *in, size_t in_height, size_t in_width, uint8_t
     const size_t count = strip_length(start, out_width, kScale8Strip);
     const size_t runs = (count + 7) / 8;
     const auto blend = [&](size_t in_row, uint16_t *into) {
-      blend_row_by_8(in + in_row * in_width, in_width, start / 8, runs, odd, into - 4);
+      blend_row_by_8(loops, in + in_row * in_width, in_width, start / 8, runs, odd, into - 4);
     };
     // Output rows 8u + 4 .. 8u + 11 lie between input rows u and u + 1, both clamped: band
     // u + 1 of the loop below. Rows 0 .. 3 lie between row 0 and itself (u = -1, band 0).
@@ -329,12 +390,12 @@ void scale_up_by_8(const uint8_t *in, size_t in_height, size_t in_width, uint8_t
       const size_t end = 8 * band + 4 < out_height ? 8 * band + 4 : out_height;
       uint8_t *rows = out + first * out_width + start;
       if (end - first == 8) {
-        mix_eight_rows(upper, lower, count, rows, out_width);
+        loops.mix_eight_rows(upper, lower, count, rows, out_width);
       } else {
         for (size_t y = first; y < end; ++y, rows += out_width) {
           const size_t lower_part = 2 * (y + 4 - 8 * band) + 1;  // in sixteenths
-          blend_rows_coarse(upper, lower, static_cast<uint32_t>(lower_part << kCoarseShift), count,
-                            rows);
+          loops.blend_rows_coarse(upper, lower, static_cast<uint32_t>(lower_part << kCoarseShift),
+                                  count, rows);
         }
       }
     }
@@ -343,20 +404,19 @@ void scale_up_by_8(const uint8_t *in, size_t in_height, size_t in_width, uint8_t
 
 }  // namespace
 
-extern "C" {
-
-void kel_blur_uint8(const uint8_t *in, uint16_t height, uint16_t width, uint8_t *out) {
+void blur(const FilterLoops &loops, const uint8_t *in, uint16_t height, uint16_t width,
+          uint8_t *out) {
   if (height == 0 || width == 0) return;
   if (in == out) {
-    blur_in_place(out, height, width);
+    blur_in_place(loops, out, height, width);
   } else {
-    blur_apart(in, height, width, out);
+    blur_apart(loops, in, height, width, out);
   }
 }
 
-void kel_scale_up_bilinear_uint8(const uint8_t *in, uint16_t in_height, uint16_t in_width,
-                                 uint16_t factor, uint8_t *out, uint16_t out_height,
-                                 uint16_t out_width) {
+void scale_up_bilinear(const FilterLoops &loops, const uint8_t *in, uint16_t in_height,
+                       uint16_t in_width, uint16_t factor, uint8_t *out, uint16_t out_height,
+                       uint16_t out_width) {
   const size_t out_pixels = size_t{out_height} * out_width;
   if (out_pixels == 0) return;
   if (in_height == 0 || in_width == 0 || factor == 0) {
@@ -364,10 +424,26 @@ void kel_scale_up_bilinear_uint8(const uint8_t *in, uint16_t in_height, uint16_t
     return;
   }
   if (factor == 8) {
-    scale_up_by_8(in, in_height, in_width, out, out_height, out_width);
+    scale_up_by_8(loops, in, in_height, in_width, out, out_height, out_width);
   } else {
-    scale_up_any(in, in_height, in_width, factor, out, out_height, out_width);
+    scale_up_any(loops, in, in_height, in_width, factor, out, out_height, out_width);
   }
+}
+
+}  // namespace outside
+}  // namespace kel
+
+extern "C" {
+
+void kel_blur_uint8(const uint8_t *in, uint16_t height, uint16_t width, uint8_t *out) {
+  kel::outside::blur(kel::outside::simd::filter_loops(), in, height, width, out);
+}
+
+void kel_scale_up_bilinear_uint8(const uint8_t *in, uint16_t in_height, uint16_t in_width,
+                                 uint16_t factor, uint8_t *out, uint16_t out_height,
+                                 uint16_t out_width) {
+  kel::outside::scale_up_bilinear(kel::outside::simd::filter_loops(), in, in_height, in_width,
+                                  factor, out, out_height, out_width);
 }
 
 }  // extern "C"
