@@ -157,8 +157,11 @@ std::string html_page(const std::vector<Section> &sections) {
       "<title>kelimg gallery</title>\n<style>\n"
       "body { font-family: sans-serif; margin: 1.5em; background: #f4f4f4; }\n"
       ".sheet { display: flex; flex-wrap: wrap; gap: 1em; }\n"
-      "figure { margin: 0; padding: 0.6em; background: #fff; max-width: 24em; }\n"
-      "img { image-rendering: pixelated; display: block; }\n"
+      // Each card is as wide as its picture (set on the card) but never wider than the page; a
+      // picture on a narrower card shrinks with it, keeping its shape.
+      "figure { margin: 0; padding: 0.6em; background: #fff; box-sizing: content-box;\n"
+      "  min-width: min(12em, 100% - 1.2em); max-width: calc(100% - 1.2em); }\n"
+      "img { image-rendering: pixelated; display: block; max-width: 100%; height: auto; }\n"
       "figcaption { font-size: 0.85em; margin-top: 0.4em; }\n"
       "code { font-size: 0.85em; color: #444; word-break: break-all; }\n"
       "</style>\n</head>\n<body>\n<h1>kelimg gallery</h1>\n"
@@ -168,7 +171,8 @@ std::string html_page(const std::vector<Section> &sections) {
   for (const Section &section : sections) {
     html += "<h2>" + section.title + "</h2>\n<div class=\"sheet\">\n";
     for (const Entry &entry : section.entries) {
-      html += "<figure><img src=\"" + entry.name + "\" width=\"" +
+      html += "<figure style=\"width: " + std::to_string(2 * entry.picture.width) +
+              "px\"><img src=\"" + entry.name + "\" width=\"" +
               std::to_string(2 * entry.picture.width) + "\" height=\"" +
               std::to_string(2 * entry.picture.height) + "\" alt=\"" + entry.name +
               "\">\n<figcaption><b>" + entry.name + "</b>: " + entry.caption + "<br><code>" +
@@ -254,7 +258,7 @@ int write_demo(const std::string &directory) {
   int pictures = 0;
   for (const Section &section : sections) {
     for (const Entry &entry : section.entries) {
-      save_png((std::filesystem::path(directory) / entry.name).string(), entry.picture);
+      save_picture((std::filesystem::path(directory) / entry.name).string(), entry.picture);
       ++pictures;
     }
   }

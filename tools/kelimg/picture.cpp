@@ -1,11 +1,14 @@
 #include "picture.h"
 
+#include <fcntl.h>
 #include <png.h>
 #include <stb_image.h>
+#include <stb_image_write.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <cctype>
 #include <cerrno>
 #include <climits>
 #include <cstdio>
@@ -13,12 +16,17 @@
 #include <cstring>
 #include <filesystem>
 #include <memory>
+#include <utility>
 
 namespace kelimg {
 namespace {
 
-std::string quoted(const std::string &path) {
-  return "'" + path + "'";
+// How messages name a file; "-" is the standard stream it stands for.
+std::string quoted(const std::string &path, const char *stream = "standard input") {
+  return path == "-" ? stream : "'" + path + "'";
+}
+std::string output_name(const std::string &path) {
+  return quoted(path, "standard output");
 }
 
 std::string system_reason() {
@@ -30,8 +38,9 @@ std::vector<uint8_t> read_file(const std::string &path) {
   if (std::filesystem::is_directory(path, error)) {
     throw InputError("cannot read " + quoted(path) + ": it is a directory");
   }
-  std::unique_ptr<std::FILE, int (*)(std::FILE *)> file(std::fopen(path.c_str(), "rb"),
-                                                        &std::fclose);
+  const auto finish = [](std::FILE *stream) { return stream == stdin ? 0 : std::fclose(stream); };
+  std::unique_ptr<std::FILE, int (*)(std::FILE *)> file(
+      path == "-" ? stdin : std::fopen(path.c_str(), "rb"), finish);
   if (!file) throw InputError("cannot open " + quoted(path) + ": " + system_reason());
   std::vector<uint8_t> bytes;
   uint8_t chunk[1 << 16];
@@ -134,44 +143,100 @@ Picture decode(const std::vector<uint8_t> &bytes, const std::string &path, bool 
   if (!changes.empty()) {
     std::string note = changes[0];
     for (size_t i = 1; i < changes.size(); ++i) note += ", " + changes[i];
-    std::fprintf(stderr, "kelimg: note: %s: %s\n", path.c_str(), note.c_str());
+    std::fprintf(stderr, "kelimg: note: %s: %s\n", quoted(path).c_str(), note.c_str());
   }
   return picture;
 }
 
-// Writes bytes to a fresh temporary file in the target's directory and renames it over the
-// target. On any failure the temporary file is removed and nothing else has changed.
-void save_bytes(const std::string &path, const void *bytes, size_t size) {
-  const std::filesystem::path target(path);
-  const std::filesystem::path directory =
-      target.has_parent_path() ? target.parent_path() : std::filesystem::path(".");
-  std::string temporary = (directory / ("." + target.filename().string() + ".XXXXXX")).string();
-  const int fd = mkstemp(temporary.data());
-  if (fd < 0) throw InputError("cannot write " + quoted(path) + ": " + system_reason());
-
-  // mkstemp makes the file private; give it the permissions an ordinary new file gets.
-  const mode_t mask = umask(0);
-  umask(mask);
-  int failure = fchmod(fd, 0666 & ~mask) == 0 ? 0 : errno;
-  const auto *next = static_cast<const char *>(bytes);
-  for (size_t left = size; failure == 0 && left > 0;) {
-    const ssize_t got = write(fd, next, left);
+// Writes every byte, resuming after interruptions and short writes; returns 0 or the errno.
+int write_all(int fd, const uint8_t *bytes, size_t size) {
+  while (size > 0) {
+    const ssize_t got = write(fd, bytes, size);
     if (got < 0 && errno == EINTR) continue;
-    if (got <= 0) {
-      failure = got < 0 ? errno : EIO;
-    } else {
-      next += got;
-      left -= static_cast<size_t>(got);
-    }
+    if (got <= 0) return got < 0 ? errno : EIO;
+    bytes += got;
+    size -= static_cast<size_t>(got);
   }
-  if (close(fd) != 0 && failure == 0) failure = errno;
-  if (failure == 0 && std::rename(temporary.c_str(), path.c_str()) != 0) failure = errno;
-  if (failure != 0) {
-    std::remove(temporary.c_str());
-    throw InputError("cannot write " + quoted(path) + ": " + std::strerror(failure));
-  }
+  return 0;
 }
 
+// The file a name finally stands for: symbolic links are followed, so that writing through a
+// link updates what it points to and leaves the link itself in place.
+std::filesystem::path resolve_links(const std::string &path) {
+  std::filesystem::path target(path);
+  std::error_code error;
+  for (int hops = 0; std::filesystem::is_symlink(target, error); ++hops) {
+    if (hops == 40) throw InputError("cannot write " + quoted(path) + ": " + std::strerror(ELOOP));
+    const std::filesystem::path next = std::filesystem::read_symlink(target, error);
+    if (error) throw InputError("cannot write " + quoted(path) + ": " + error.message());
+    target = next.is_absolute() ? next : target.parent_path() / next;
+  }
+  return target;
+}
+
+struct Encoder {
+  std::vector<uint8_t> bytes;
+  static void append(void *context, void *data, int size) {
+    const auto *first = static_cast<const uint8_t *>(data);
+    static_cast<Encoder *>(context)->bytes.insert(static_cast<Encoder *>(context)->bytes.end(),
+                                                  first, first + size);
+  }
+};
+
+std::vector<uint8_t> encode_png(const std::string &path, const Picture &picture) {
+  png_image image;
+  std::memset(&image, 0, sizeof image);
+  image.version = PNG_IMAGE_VERSION;
+  image.width = static_cast<png_uint_32>(picture.width);
+  image.height = static_cast<png_uint_32>(picture.height);
+  image.format = PNG_FORMAT_GRAY;
+  png_alloc_size_t size = 0;
+  // The first call measures, the second encodes.
+  bool encoded =
+      png_image_write_to_memory(&image, nullptr, &size, 0, picture.data(), 0, nullptr) != 0;
+  std::vector<uint8_t> encoding(encoded ? size : 0);
+  encoded = encoded && png_image_write_to_memory(&image, encoding.data(), &size, 0, picture.data(),
+                                                 0, nullptr) != 0;
+  if (!encoded) {
+    const std::string reason = image.message;
+    png_image_free(&image);
+    throw InputError("cannot encode " + output_name(path) + ": " + reason);
+  }
+  encoding.resize(size);
+  return encoding;
+}
+
+std::vector<uint8_t> encode_pgm(const Picture &picture) {
+  const std::string header =
+      "P5\n" + std::to_string(picture.width) + " " + std::to_string(picture.height) + "\n255\n";
+  std::vector<uint8_t> bytes(header.begin(), header.end());
+  bytes.insert(bytes.end(), picture.pixels.begin(), picture.pixels.end());
+  return bytes;
+}
+
+// BMP and JPEG come from stb_image_write, which counts bytes in int and writes JPEG sides in
+// 16 bits; pictures beyond either are refused before it is called.
+std::vector<uint8_t> encode_stb(const std::string &path, const Picture &picture, Format format) {
+  const int64_t bmp_bytes = (int64_t{picture.width} * 3 + 3) * picture.height + 54;
+  if ((format == Format::bmp && bmp_bytes > INT_MAX) ||
+      (format == Format::jpeg && (picture.width > 65535 || picture.height > 65535))) {
+    throw InputError("cannot encode " + output_name(path) + ": the picture is too large for " +
+                     (format == Format::bmp ? "BMP" : "JPEG"));
+  }
+  Encoder encoder;
+  const int written = format == Format::bmp
+                          ? stbi_write_bmp_to_func(Encoder::append, &encoder, picture.width,
+                                                   picture.height, 1, picture.data())
+                          : stbi_write_jpg_to_func(Encoder::append, &encoder, picture.width,
+                                                   picture.height, 1, picture.data(), kJpegQuality);
+  if (written == 0) throw InputError("cannot encode " + output_name(path));
+  return std::move(encoder.bytes);
+}
+
+std::string lower(std::string text) {
+  for (char &c : text) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+  return text;
+}
 }  // namespace
 
 Picture::Picture(int32_t picture_width, int32_t picture_height, uint8_t value)
@@ -190,30 +255,92 @@ Picture load_picture(const std::string &path) {
   return decode<uint8_t>(bytes, path, cut_to_8_bits);
 }
 
-void save_png(const std::string &path, const Picture &picture) {
-  png_image image;
-  std::memset(&image, 0, sizeof image);
-  image.version = PNG_IMAGE_VERSION;
-  image.width = static_cast<png_uint_32>(picture.width);
-  image.height = static_cast<png_uint_32>(picture.height);
-  image.format = PNG_FORMAT_GRAY;
-  png_alloc_size_t size = 0;
-  // The first call measures, the second encodes.
-  bool encoded =
-      png_image_write_to_memory(&image, nullptr, &size, 0, picture.data(), 0, nullptr) != 0;
-  std::vector<uint8_t> encoding(encoded ? size : 0);
-  encoded = encoded && png_image_write_to_memory(&image, encoding.data(), &size, 0, picture.data(),
-                                                 0, nullptr) != 0;
-  if (!encoded) {
-    const std::string reason = image.message;
-    png_image_free(&image);
-    throw InputError("cannot encode " + quoted(path) + ": " + reason);
+Format output_format(const std::string &path) {
+  const std::string extension = lower(std::filesystem::path(path).extension().string());
+  if (path == "-" || extension.empty() || extension == ".png") return Format::png;
+  if (extension == ".pgm") return Format::pgm;
+  if (extension == ".bmp") return Format::bmp;
+  if (extension == ".jpg" || extension == ".jpeg") return Format::jpeg;
+  throw InputError("cannot write " + output_name(path) + ": no format is written for '" +
+                   extension + "'; the formats out are " + kFormatsOut);
+}
+
+PendingOutput::PendingOutput(const std::string &path, std::vector<uint8_t> bytes)
+    : path_(path), bytes_(std::move(bytes)) {
+  if (path == "-") return;  // written at commit, like any stream
+  target_ = resolve_links(path).string();
+  struct stat status;
+  if (stat(target_.c_str(), &status) == 0 && !S_ISREG(status.st_mode)) {
+    if (S_ISDIR(status.st_mode)) {
+      throw InputError("cannot write " + output_name(path) + ": it is a directory");
+    }
+    return;  // a device, pipe or socket: written in place at commit, never replaced
   }
-  save_bytes(path, encoding.data(), size);
+  const std::filesystem::path target(target_);
+  const std::filesystem::path directory =
+      target.has_parent_path() ? target.parent_path() : std::filesystem::path(".");
+  temporary_ = (directory / ("." + target.filename().string() + ".XXXXXX")).string();
+  const int fd = mkstemp(temporary_.data());
+  if (fd < 0) {
+    temporary_.clear();
+    throw InputError("cannot write " + output_name(path) + ": " + system_reason());
+  }
+  // mkstemp makes the file private; give it the permissions an ordinary new file gets.
+  const mode_t mask = umask(0);
+  umask(mask);
+  int failure = fchmod(fd, 0666 & ~mask) == 0 ? 0 : errno;
+  if (failure == 0) failure = write_all(fd, bytes_.data(), bytes_.size());
+  if (close(fd) != 0 && failure == 0) failure = errno;
+  bytes_.clear();
+  if (failure != 0) fail(failure);
+}
+
+PendingOutput::PendingOutput(PendingOutput &&other) noexcept
+    : path_(std::move(other.path_)),
+      target_(std::move(other.target_)),
+      temporary_(std::exchange(other.temporary_, std::string())),
+      bytes_(std::move(other.bytes_)) {}
+
+PendingOutput::~PendingOutput() {
+  if (!temporary_.empty()) std::remove(temporary_.c_str());
+}
+
+void PendingOutput::fail(int failure) {
+  if (!temporary_.empty()) std::remove(temporary_.c_str());
+  temporary_.clear();
+  throw InputError("cannot write " + output_name(path_) + ": " + std::strerror(failure));
+}
+
+void PendingOutput::commit() {
+  if (!temporary_.empty()) {
+    if (std::rename(temporary_.c_str(), target_.c_str()) != 0) fail(errno);
+    temporary_.clear();
+    return;
+  }
+  const int fd = path_ == "-" ? STDOUT_FILENO : open(target_.c_str(), O_WRONLY | O_CLOEXEC);
+  if (fd < 0) fail(errno);
+  int failure = write_all(fd, bytes_.data(), bytes_.size());
+  if (fd != STDOUT_FILENO && close(fd) != 0 && failure == 0) failure = errno;
+  if (failure != 0) fail(failure);
+}
+
+PendingOutput stage_picture(const std::string &path, const Picture &picture) {
+  const Format format = output_format(path);
+  switch (format) {
+    case Format::png:
+      return PendingOutput(path, encode_png(path, picture));
+    case Format::pgm:
+      return PendingOutput(path, encode_pgm(picture));
+    default:
+      return PendingOutput(path, encode_stb(path, picture, format));
+  }
+}
+
+void save_picture(const std::string &path, const Picture &picture) {
+  stage_picture(path, picture).commit();
 }
 
 void save_text(const std::string &path, const std::string &text) {
-  save_bytes(path, text.data(), text.size());
+  PendingOutput(path, std::vector<uint8_t>(text.begin(), text.end())).commit();
 }
-
 }  // namespace kelimg

@@ -33,15 +33,51 @@ struct Picture {
   int64_t pixel_count() const { return int64_t{width} * height; }
 };
 
-// Reads a PNG, JPEG, BMP, PGM (or anything else the decoder knows) as 8-bit grey. Colour is
-// turned grey and 16-bit samples lose their low byte, with a one-line note on stderr.
+// What the tool reads (whatever stb_image decodes) and writes, for --help and messages.
+constexpr const char *kFormatsIn = "PNG, JPEG, BMP, PGM/PPM, GIF, TGA, PSD, HDR and PIC";
+constexpr const char *kFormatsOut =
+    "PNG (.png, and - or a name without an extension), PGM (.pgm), BMP (.bmp), JPEG (.jpg, .jpeg; "
+    "quality 95), chosen by the output's extension";
+constexpr int kJpegQuality = 95;
+
+// Reads any format in kFormatsIn as 8-bit grey; "-" reads standard input. Colour is turned grey
+// and 16-bit samples lose their low byte, with a one-line note on stderr.
 Picture load_picture(const std::string &path);
 
-// Writes an 8-bit grey PNG. The bytes go to a temporary file beside the target, which is
-// renamed over it only when complete, so a failure never leaves a partly written picture.
-void save_png(const std::string &path, const Picture &picture);
+enum class Format { png, pgm, bmp, jpeg };
 
-// Writes text (the gallery's index.html) with the same all-or-nothing rename.
+// The format an output's extension names (see kFormatsOut); any other extension is an
+// InputError, so that a name never promises one format and holds another.
+Format output_format(const std::string &path);
+
+// An output whose bytes are ready but not yet in place. A regular file (or one not there yet)
+// is written to a temporary file beside it, which commit() renames over it: a failure before
+// then leaves the target as it was. "-" is standard output, and devices, pipes and other
+// special files are written in place at commit(), never replaced. Symbolic links are followed.
+class PendingOutput {
+ public:
+  PendingOutput(const std::string &path, std::vector<uint8_t> bytes);
+  PendingOutput(PendingOutput &&other) noexcept;
+  PendingOutput &operator=(PendingOutput &&) = delete;
+  ~PendingOutput();  // removes the temporary file unless committed
+
+  void commit();
+
+ private:
+  [[noreturn]] void fail(int failure);
+
+  std::string path_;            // as the user gave it, for messages
+  std::string target_;          // with symbolic links followed
+  std::string temporary_;       // the staged file, while there is one
+  std::vector<uint8_t> bytes_;  // for special files, until commit
+};
+
+// Encodes the picture in the format its name asks for and stages it.
+PendingOutput stage_picture(const std::string &path, const Picture &picture);
+
+void save_picture(const std::string &path, const Picture &picture);
+
+// Writes text (the gallery's index.html) the same way.
 void save_text(const std::string &path, const std::string &text);
 
 }  // namespace kelimg
