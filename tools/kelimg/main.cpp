@@ -194,7 +194,9 @@ void transform_pictures(const Pictures &pictures, const std::string &context,
   std::string report;
   kelimg::save_picture(pictures.files[1],
                        transform(kelimg::load_picture(pictures.files[0]), report));
-  if (!report.empty()) std::printf("%s\n", report.c_str());
+  // A picture written to standard output keeps it to itself.
+  if (!report.empty())
+    std::fprintf(pictures.files[1] == "-" ? stderr : stdout, "%s\n", report.c_str());
 }
 
 void add_input(CLI::App *command, std::string &path, const char *name = "IN",
@@ -208,7 +210,7 @@ void add_output(CLI::App *command, std::string &path) {
 
 // The true mean, variance and deviation from 64-bit sums, beside the library's figures, which are
 // whole numbers from sums that wrap at 32 bits.
-void print_exact_figures(const kelimg::Statistics &stats) {
+void print_exact_figures(std::FILE *text, const kelimg::Statistics &stats) {
   uint64_t sum = 0;
   for (uint32_t value = 0; value < 256; ++value) sum += uint64_t{stats.histogram[value]} * value;
   const double mean = static_cast<double>(sum) / stats.count;
@@ -217,8 +219,9 @@ void print_exact_figures(const kelimg::Statistics &stats) {
     squares += stats.histogram[value] * (value - mean) * (value - mean);
   }
   const double variance = squares / stats.count;
-  std::printf("exact (64-bit sums, by kelimg):\nmean      %.4f\nvariance  %.4f\nstd dev   %.4f\n",
-              mean, variance, std::sqrt(variance));
+  std::fprintf(text,
+               "exact (64-bit sums, by kelimg):\nmean      %.4f\nvariance  %.4f\nstd dev   %.4f\n",
+               mean, variance, std::sqrt(variance));
 }
 
 Subcommand add_stats(CLI::App &app) {
@@ -247,13 +250,15 @@ Subcommand add_stats(CLI::App &app) {
             const Picture picture = kelimg::load_picture(o->input);
             const kelimg::Statistics stats = kelimg::statistics(picture);
             if (!o->plot.empty()) kelimg::save_picture(o->plot, kelimg::plot_histogram(stats));
-            std::printf("size      %" PRId32 " x %" PRId32 " (%" PRIu32 " pixels)\n", picture.width,
-                        picture.height, stats.count);
-            std::printf(
-                "library (whole numbers, 32-bit sums):\nmean      %u\nvariance  %u\n"
-                "std dev   %u\n",
-                stats.mean, stats.variance, stats.std_dev);
-            if (o->exact) print_exact_figures(stats);
+            // A plot written to standard output keeps it to itself.
+            std::FILE *text = o->plot == "-" ? stderr : stdout;
+            std::fprintf(text, "size      %" PRId32 " x %" PRId32 " (%" PRIu32 " pixels)\n",
+                         picture.width, picture.height, stats.count);
+            std::fprintf(text,
+                         "library (whole numbers, 32-bit sums):\nmean      %u\nvariance  %u\n"
+                         "std dev   %u\n",
+                         stats.mean, stats.variance, stats.std_dev);
+            if (o->exact) print_exact_figures(text, stats);
             if ((stats.mean_wrapped || stats.variance_wrapped) && !o->exact) {
               std::fprintf(stderr,
                            "kelimg stats: warning: the %s sum passed 32 bits and wrapped, as the "
@@ -265,9 +270,10 @@ Subcommand add_stats(CLI::App &app) {
             const uint32_t span = 256u >> o->bits;
             for (uint32_t bin = 0; bin < bins.size(); ++bin) {
               if (span == 1) {
-                std::printf("%u %" PRIu32 "\n", bin, bins[bin]);
+                std::fprintf(text, "%u %" PRIu32 "\n", bin, bins[bin]);
               } else {
-                std::printf("%u-%u %" PRIu32 "\n", bin * span, bin * span + span - 1, bins[bin]);
+                std::fprintf(text, "%u-%u %" PRIu32 "\n", bin * span, bin * span + span - 1,
+                             bins[bin]);
               }
             }
           }};
