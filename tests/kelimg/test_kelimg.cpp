@@ -78,6 +78,7 @@ const Case kCases[] = {
     {"kelimg convert in.png out.JPG", 0, "", "", "out.JPG", "41x23 ", "\xff\xd8\xff"},
     {"kelimg convert - out.png < in.png", 0, "", "", "out.png", kIn},
     {"kelimg convert in.png - | cat > piped.png", 0, "", "", "piped.png", kIn, "\x89PNG"},
+    {"kelimg convert in.png /dev/stdout | cat > piped.png", 0, "", "", "piped.png", kIn},
     {"mkfifo fifo && { timeout 10 cat fifo > piped.png & } && kelimg convert in.png fifo && "
      "wait && test -p fifo",
      0, "", "", "piped.png", kIn},

@@ -161,12 +161,15 @@ int write_all(int fd, const uint8_t *bytes, size_t size) {
 }
 
 // The file a name finally stands for: symbolic links are followed, so that writing through a
-// link updates what it points to and leaves the link itself in place.
+// link updates what it points to and leaves the link itself in place. Links under /proc (where
+// /dev/stdout leads) stand for open descriptors rather than paths, so a chain through one gives
+// an empty path: such an output is written in place, like the stream it is.
 std::filesystem::path resolve_links(const std::string &path) {
   std::filesystem::path target(path);
   std::error_code error;
   for (int hops = 0; std::filesystem::is_symlink(target, error); ++hops) {
     if (hops == 40) throw InputError("cannot write " + quoted(path) + ": " + std::strerror(ELOOP));
+    if (target.string().rfind("/proc/", 0) == 0) return {};
     const std::filesystem::path next = std::filesystem::read_symlink(target, error);
     if (error) throw InputError("cannot write " + quoted(path) + ": " + error.message());
     target = next.is_absolute() ? next : target.parent_path() / next;
@@ -268,13 +271,15 @@ Format output_format(const std::string &path) {
 PendingOutput::PendingOutput(const std::string &path, std::vector<uint8_t> bytes)
     : path_(path), bytes_(std::move(bytes)) {
   if (path == "-") return;  // written at commit, like any stream
-  target_ = resolve_links(path).string();
   struct stat status;
-  if (stat(target_.c_str(), &status) == 0 && !S_ISREG(status.st_mode)) {
-    if (S_ISDIR(status.st_mode)) {
-      throw InputError("cannot write " + output_name(path) + ": it is a directory");
-    }
-    return;  // a device, pipe or socket: written in place at commit, never replaced
+  const bool special = stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode);
+  if (special && S_ISDIR(status.st_mode)) {
+    throw InputError("cannot write " + output_name(path) + ": it is a directory");
+  }
+  target_ = special ? std::string() : resolve_links(path).string();
+  if (target_.empty()) {
+    target_ = path;  // a device, pipe or socket: written in place at commit, never replaced
+    return;
   }
   const std::filesystem::path target(target_);
   const std::filesystem::path directory =
@@ -317,7 +322,10 @@ void PendingOutput::commit() {
     temporary_.clear();
     return;
   }
-  const int fd = path_ == "-" ? STDOUT_FILENO : open(target_.c_str(), O_WRONLY | O_CLOEXEC);
+  // Appending continues a file reached through /dev/stdout where the descriptor has got to,
+  // rather than at its start; to devices and pipes it makes no difference.
+  const int fd =
+      path_ == "-" ? STDOUT_FILENO : open(target_.c_str(), O_WRONLY | O_APPEND | O_CLOEXEC);
   if (fd < 0) fail(errno);
   int failure = write_all(fd, bytes_.data(), bytes_.size());
   if (fd != STDOUT_FILENO && close(fd) != 0 && failure == 0) failure = errno;
