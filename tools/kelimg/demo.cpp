@@ -154,6 +154,7 @@ Section figures() {
 std::string html_page(const std::vector<Section> &sections) {
   std::string html =
       "<!DOCTYPE html>\n<html lang=\"en\">\n<head>\n<meta charset=\"utf-8\">\n"
+      "<meta name=\"viewport\" content=\"width=device-width, initial-scale=1\">\n"
       "<title>kelimg gallery</title>\n<style>\n"
       "body { font-family: sans-serif; margin: 1.5em; background: #f4f4f4; }\n"
       ".sheet { display: flex; flex-wrap: wrap; gap: 1em; }\n"
@@ -167,7 +168,7 @@ std::string html_page(const std::vector<Section> &sections) {
       "</style>\n</head>\n<body>\n<h1>kelimg gallery</h1>\n"
       "<p>Every picture was made by <code>kelimg demo</code> with the kel_images routines; the "
       "command under each one makes it again from the pictures in this directory. Pictures are "
-      "shown at twice their size.</p>\n";
+      "shown at twice their size where the window has room.</p>\n";
   for (const Section &section : sections) {
     html += "<h2>" + section.title + "</h2>\n<div class=\"sheet\">\n";
     for (const Entry &entry : section.entries) {
