@@ -225,9 +225,13 @@ ColumnRange hole_columns(const uint8_t *mask_row, size_t width) {
   return {first, first + kel::simd::end_of_last_zero(mask_row + first, width - first)};
 }
 
-// Interior columns classified together; a piece's windows and values take about 400 bytes of
-// stack.
+// Interior columns classified together; a piece's windows and values take about 3 bytes of stack
+// per column, so builds for size (MinSizeRel, as for microcontrollers) take shorter pieces.
+#if KEL_SMALL_BUILD
 constexpr size_t kEdgePiece = 128;
+#else
+constexpr size_t kEdgePiece = 256;
+#endif
 
 // Which extreme of each pixel's 3 x 3 window of mask values is taken. A border pixel (known, a
 // hole among its neighbours) has a window minimum of 0, a seam pixel (a hole, a known

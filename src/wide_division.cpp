@@ -2,7 +2,7 @@
 
 namespace kel {
 
-WideQuotient divide_wide(uint64_t dividend, uint32_t divisor) {
+WideQuotient divide_wide_in_steps(uint64_t dividend, uint32_t divisor) {
   const auto high = static_cast<uint32_t>(dividend >> 32);
   const auto low = static_cast<uint32_t>(dividend);
   if (high == 0) return {low / divisor, low % divisor};

@@ -13,12 +13,12 @@
 #include "image_filters_simd.h"
 #include "kel_outside.h"
 
-// A build optimised for size (-Os, as for microcontrollers) leaves out the paths that only make a
-// call faster; the general paths that remain give the same bytes.
-#if defined(__OPTIMIZE_SIZE__)
-#define KEL_SMALL_CODE 1
+// A build for size (MinSizeRel, as for microcontrollers) keeps shorter strips on the stack and
+// leaves out the one-sweep blur, which only makes a call faster.
+#if KEL_SMALL_BUILD
+constexpr bool kSmallBuild = true;
 #else
-#define KEL_SMALL_CODE 0
+constexpr bool kSmallBuild = false;
 #endif
 
 namespace kel {
@@ -34,7 +34,7 @@ size_t strip_length(size_t start, size_t total, size_t strip) {
 // ---------------------------------------------------------------------------------------------
 
 // Columns handled at a time where a pass needs a copy of its input on the stack.
-constexpr size_t kBlurStrip = 128;
+constexpr size_t kBlurStrip = kSmallBuild ? 128 : 256;
 
 // (a + 2b + c + 2) >> 2: each pass rounds half up, so a constant raster stays constant. It is
 // taken as two 8-bit averages, which vector units do in one instruction each. With
@@ -80,7 +80,7 @@ void smooth_down_carrying(uint8_t *above, uint8_t *row, const uint8_t *below, si
 
 namespace {
 
-#if !KEL_SMALL_CODE
+#if !KEL_SMALL_BUILD
 // The horizontal pass of one row, handed column by column to `column(x, smoothed)`; the first
 // and last columns are their own outer neighbours.
 template <typename Column>
@@ -173,7 +173,7 @@ void blur_in_place(const FilterLoops &loops, uint8_t *pixels, size_t height, siz
 
 // Output columns handled at a time: 6 bytes of sample position and 4 of blended input rows
 // each, on the stack.
-constexpr size_t kScaleStrip = 32;
+constexpr size_t kScaleStrip = kSmallBuild ? 32 : 256;
 
 // The two input samples an output pixel lies between, and the weight of the second one in
 // 1/256 units (0 .. 255).
@@ -307,7 +307,7 @@ void scale_up_any(const FilterLoops &loops, const uint8_t *in, uint16_t in_heigh
 
 // Output columns handled at a time: two blended rows of 2 bytes per column and the row's samples
 // spread over a byte per column, on the stack.
-constexpr size_t kScale8Strip = 64;
+constexpr size_t kScale8Strip = kSmallBuild ? 64 : 256;
 
 // One input row blended along the columns, in sixteenths (at most 4080): the 8 output columns
 // 8k + 4 .. 8k + 11 take 16 s[k] + (2j + 1) (s[k + 1] - s[k]), j = 0 .. 7, from the samples
@@ -419,7 +419,7 @@ void scale_up_by_8(const FilterLoops &loops, const uint8_t *in, size_t in_height
 void blur(const FilterLoops &loops, const uint8_t *in, uint16_t height, uint16_t width,
           uint8_t *out) {
   if (height == 0 || width == 0) return;
-#if KEL_SMALL_CODE
+#if KEL_SMALL_BUILD
   // The in-place blur of a copy gives the same bytes without the code of the one-sweep blur.
   if (in != out) std::memcpy(out, in, size_t{height} * width);
   blur_in_place(loops, out, height, width);
