@@ -330,7 +330,8 @@ void kel_image_draw_triangle(uint8_t *buf, int32_t height, int32_t width, int32_
                              int32_t x1, int32_t y1, int32_t x2, int32_t y2, uint8_t colour) {
   kel_image_draw_line(buf, height, width, x0, y0, x1, y1, colour);
   kel_image_draw_line(buf, height, width, x1, y1, x2, y2, colour);
-  kel_image_draw_line(buf, height, width, x2, y2, x0, y0, colour);}
+  kel_image_draw_line(buf, height, width, x2, y2, x0, y0, colour);
+}
 
 void kel_image_draw_rectangle(uint8_t *buf, int32_t height, int32_t width, int32_t x, int32_t y,
                               uint32_t rect_width, uint32_t rect_height, uint8_t colour) {
