@@ -16,6 +16,7 @@
 #include <utility>
 
 #include "kel_images.h"
+#include "wide_division.h"
 
 namespace {
 
@@ -48,7 +49,7 @@ struct Steps {
 
 // The steps k at which the coordinate start + direction * k (direction -1, 0 or +1) lies in
 // [0, extent). Empty when extent <= 0.
-Steps steps_inside(int64_t start, int64_t direction, int32_t extent) {
+Steps steps_inside(int64_t start, int32_t direction, int32_t extent) {
   if (direction > 0) return {-start, extent - start};
   if (direction < 0) return {start - extent + 1, start + 1};
   if (start >= 0 && start < extent) {
@@ -60,7 +61,7 @@ Steps steps_inside(int64_t start, int64_t direction, int32_t extent) {
 // The pixels (x + k * step_x, y + k * step_y) for the steps k in `along`, step_x and step_y each
 // -1, 0 or +1: a row, a column or a diagonal. Those inside form one range of k; a run along a row
 // is one memset, any other is written by stepping a buffer index.
-void draw_run(const Raster &raster, int64_t x, int64_t y, int64_t step_x, int64_t step_y,
+void draw_run(const Raster &raster, int64_t x, int64_t y, int32_t step_x, int32_t step_y,
               Steps along, uint8_t colour) {
   const Steps inside = along.intersect(steps_inside(x, step_x, raster.width))
                            .intersect(steps_inside(y, step_y, raster.height));
@@ -90,26 +91,29 @@ void draw_run(const Raster &raster, int64_t x, int64_t y, int64_t step_x, int64_
 // keeps i * minor_length below 2^64: every line is drawn exactly, whatever its end points.
 struct LineInterior {
   bool steep;  // the major axis is the row
-  int64_t major_start, major_direction;
-  int64_t minor_start, minor_direction;
-  uint64_t major_length, minor_length;
+  int64_t major_start;
+  int32_t major_direction;
+  int64_t minor_start;
+  int32_t minor_direction;
+  uint32_t major_length, minor_length;
 
-  uint64_t minor_offset(int64_t i) const {
-    return static_cast<uint64_t>(i) * minor_length / major_length;
+  // floor(i * minor_length / major_length) and what it leaves over.
+  kel::WideQuotient minor_offset(int64_t i) const {
+    return kel::divide_wide(static_cast<uint64_t>(i) * minor_length, major_length);
   }
 };
 
 // The first step of a nonempty range whose minor progress (the minor coordinate times
 // minor_direction, nondecreasing along the line) reaches target; steps.end if none. The offset
 // floor(i * minor / major) reaches t > 0 exactly when i * minor >= t * major, so the step is ceil(t
-// * major / minor). Both t and major_length are below 2^32, so the product and the rounding up stay
-// below 2^64.
+// * major / minor). Both t and major_length are below 2^32, so the product stays below 2^64.
 int64_t first_step_reaching(const LineInterior &line, Steps steps, int64_t target) {
   const int64_t needed = target - line.minor_direction * line.minor_start;
   if (needed <= 0) return steps.begin;
   if (line.minor_length == 0) return steps.end;
-  const uint64_t product = static_cast<uint64_t>(needed) * line.major_length;
-  const uint64_t step = (product + line.minor_length - 1) / line.minor_length;
+  const kel::WideQuotient whole =
+      kel::divide_wide(static_cast<uint64_t>(needed) * line.major_length, line.minor_length);
+  const uint64_t step = whole.quotient + (whole.remainder != 0 ? 1 : 0);
   if (step >= static_cast<uint64_t>(steps.end)) return steps.end;
   return std::max(steps.begin, static_cast<int64_t>(step));
 }
@@ -134,9 +138,7 @@ void draw_line_interior(const Raster &raster, const LineInterior &line, uint8_t 
   if (steps.empty()) return;
   // i * minor_length = quotient * major_length + remainder: one division for the first pixel
   // inside, then the offset carries by at most one per step (minor_length <= major_length).
-  const uint64_t quotient = line.minor_offset(steps.begin);
-  const uint64_t remainder =
-      static_cast<uint64_t>(steps.begin) * line.minor_length - quotient * line.major_length;
+  const kel::WideQuotient offset = line.minor_offset(steps.begin);
   // Every pixel of the range lies inside, so the loop steps a buffer index instead of testing
   // each pixel: one major step always, one minor step when the offset carries.
   const int64_t width = raster.width;
@@ -145,13 +147,14 @@ void draw_line_interior(const Raster &raster, const LineInterior &line, uint8_t 
   const int64_t major_length = static_cast<int64_t>(line.major_length);
   const int64_t minor_length = static_cast<int64_t>(line.minor_length);
   const int64_t major = line.major_start + line.major_direction * steps.begin;
-  const int64_t minor = line.minor_start + line.minor_direction * static_cast<int64_t>(quotient);
+  const int64_t minor =
+      line.minor_start + line.minor_direction * static_cast<int64_t>(offset.quotient);
   int64_t at = line.steep ? major * width + minor : minor * width + major;
   uint8_t *const pixels = raster.pixels;
   // remainder - major_length: the offset carries when adding minor_length makes it nonnegative.
   // (A branch-free carry measured slower: it lengthens the chain from one step to the next, and
   // the carries of a line repeat in a pattern that branch prediction follows.)
-  int64_t excess = static_cast<int64_t>(remainder) - major_length;
+  int64_t excess = int64_t{offset.remainder} - major_length;
   for (int64_t n = steps.end - steps.begin; n > 0; --n) {
     pixels[static_cast<size_t>(at)] = colour;
     excess += minor_length;
@@ -163,8 +166,9 @@ void draw_line_interior(const Raster &raster, const LineInterior &line, uint8_t 
   }
 }
 
-uint64_t magnitude(int64_t value) {
-  return value < 0 ? static_cast<uint64_t>(-value) : static_cast<uint64_t>(value);
+// |value| of a difference of two 32-bit coordinates, below 2^32.
+uint32_t magnitude(int64_t value) {
+  return static_cast<uint32_t>(value < 0 ? -value : value);
 }
 
 void draw_line(const Raster &raster, int64_t x0, int64_t y0, int64_t x1, int64_t y1,
@@ -178,8 +182,8 @@ void draw_line(const Raster &raster, int64_t x0, int64_t y0, int64_t x1, int64_t
   }
   const int64_t dx = x1 - x0, dy = y1 - y0;
   if (dx == 0 && dy == 0) return;
-  const int64_t dx_direction = dx < 0 ? -1 : 1;
-  const uint64_t run = magnitude(dx), rise = static_cast<uint64_t>(dy);
+  const int32_t dx_direction = dx < 0 ? -1 : 1;
+  const uint32_t run = magnitude(dx), rise = static_cast<uint32_t>(dy);
   if (rise > run) {
     draw_line_interior(raster, {true, y0, 1, x0, dx_direction, rise, run}, colour);
   } else {
@@ -273,6 +277,10 @@ void draw_number(const Raster &raster, int32_t value, uint8_t min_digits, int64_
 
 // Straight edge length minus floor(d / 2), indexed by (d - 3) % 4.
 constexpr int8_t kEdgeAdjustment[4] = {0, 0, 1, -1};
+// The directions of an octagon's runs: top and bottom edges, left and right edges, then the
+// diagonals from the left and right edges up and down.
+constexpr int8_t kCircleSteps[8][2] = {{1, 0},  {1, 0},   {0, 1}, {0, 1},
+                                       {1, -1}, {-1, -1}, {1, 1}, {-1, 1}};
 
 // An octagon that fills a d x d box: four straight edges of L pixels and four diagonal runs of
 // s pixels, with L + 2 * (s + 1) = d.
@@ -298,16 +306,15 @@ void draw_circle(const Raster &raster, uint32_t diameter, int64_t x, int64_t y, 
   const int64_t edge_y_last = edge_y + edge - 1;
 
   // Edges first, then the four diagonal runs; each j of a diagonal is one step of its run.
+  const int64_t starts[8][2] = {{edge_x, top},       {edge_x, bottom},    {left, edge_y},
+                                {right, edge_y},     {left, edge_y},      {right, edge_y},
+                                {left, edge_y_last}, {right, edge_y_last}};
   const Steps along_edge{0, edge};
-  draw_run(raster, edge_x, top, 1, 0, along_edge, colour);
-  draw_run(raster, edge_x, bottom, 1, 0, along_edge, colour);
-  draw_run(raster, left, edge_y, 0, 1, along_edge, colour);
-  draw_run(raster, right, edge_y, 0, 1, along_edge, colour);
   const Steps along_diagonal{1, diagonal + 1};
-  draw_run(raster, left, edge_y, 1, -1, along_diagonal, colour);
-  draw_run(raster, right, edge_y, -1, -1, along_diagonal, colour);
-  draw_run(raster, left, edge_y_last, 1, 1, along_diagonal, colour);
-  draw_run(raster, right, edge_y_last, -1, 1, along_diagonal, colour);
+  for (int run = 0; run < 8; ++run) {
+    draw_run(raster, starts[run][0], starts[run][1], kCircleSteps[run][0], kCircleSteps[run][1],
+             run < 4 ? along_edge : along_diagonal, colour);
+  }
 }
 
 }  // namespace

@@ -90,17 +90,11 @@ VisibleRect visible_rect(int32_t dst_height, int32_t dst_width, uint16_t src_hei
   return rect;
 }
 
-// Copies count bytes with the result of d[i] = s[i] for i = 0, 1, ... in turn, also when the
-// ranges overlap. A forward copy that reads ahead (memmove, or the vector loop) equals it unless
-// the destination starts inside the source; then the forward copy repeats the first
-// (to - from) source bytes, which copying in blocks of that length reproduces, each block's
-// source being the previous, finished block.
-void copy_forward(const kel::CompositeRowLoops &loops, uint8_t *to, const uint8_t *from,
-                  size_t count) {
-  if (!starts_inside(to, from, count)) {
-    loops.copy(from, count, to);
-    return;
-  }
+// Copies count bytes with the result of d[i] = s[i] for i = 0, 1, ... in turn, for a destination
+// that starts inside the source: a forward copy that reads ahead (memmove, or the vector loop)
+// would differ, but repeating the first (to - from) source bytes, which copying in blocks of that
+// length does, each block's source being the previous, finished block, gives the same bytes.
+void copy_in_order(const uint8_t *from, size_t count, uint8_t *to) {
   const size_t period = static_cast<size_t>(to - from);
   for (size_t done = 0; done < count; done += period) {
     const size_t block = count - done < period ? count - done : period;
@@ -108,68 +102,74 @@ void copy_forward(const kel::CompositeRowLoops &loops, uint8_t *to, const uint8_
   }
 }
 
-// The keyed row. Looking ahead at the source before writing is safe unless the destination
-// starts inside the source; that row takes the pixel loop as a whole. Otherwise the vector
-// variant does it, or, without one, pieces that hold no key go as opaque rows.
-template <class Rule>
-void keyed_row(const kel::CompositeRowLoops &loops, uint8_t *to, const uint8_t *from, size_t count,
-               uint8_t transparent) {
-  if (starts_inside(to, from, count)) {
-    Rule::keyed_loop(kel::plain::composite_row_loops())(from, count, transparent, to);
+// How a paste or a blend writes a row: without a key, and with one.
+struct RowRule {
+  kel::RowLoop opaque;
+  kel::KeyedRowLoop keyed;
+};
+
+// Paste and blend differ only in their row loops: this machine's, and those that read each
+// source pixel just before writing its destination pixel, for a row whose destination starts
+// inside its source.
+struct Compositing {
+  RowRule fast, in_order;
+};
+
+Compositing paste_rules(const kel::CompositeRowLoops &loops) {
+  return {{loops.copy, loops.paste_with_key}, {copy_in_order, kel::plain::paste_row_with_key}};
+}
+
+Compositing blend_rules(const kel::CompositeRowLoops &loops) {
+  return {{loops.blend, loops.blend_with_key},
+          {kel::plain::blend_row, kel::plain::blend_row_with_key}};
+}
+
+// The keyed row, in one call of the keyed loop or, where the loops are plain ones, in pieces:
+// those that hold no key go as opaque rows, which copy or blend without looking at each pixel.
+#if KEL_USE_HIGHWAY
+constexpr bool kKeyedLoopsAreVectors = true;
+#else
+constexpr bool kKeyedLoopsAreVectors = false;
+#endif
+
+void keyed_row(const RowRule &rule, uint8_t *to, const uint8_t *from, size_t count,
+               uint8_t transparent, bool in_pieces) {
+  if (!in_pieces) {
+    rule.keyed(from, count, transparent, to);
     return;
   }
-#if KEL_USE_HIGHWAY
-  Rule::keyed_loop(loops)(from, count, transparent, to);
-#else
   // Pixels looked at together: a piece without the key is done as an opaque row.
   constexpr size_t kKeyPiece = 64;
   for (size_t start = 0; start < count; start += kKeyPiece) {
     const size_t piece = count - start < kKeyPiece ? count - start : kKeyPiece;
     if (holds(from + start, piece, transparent)) {
-      Rule::keyed_loop(loops)(from + start, piece, transparent, to + start);
+      rule.keyed(from + start, piece, transparent, to + start);
     } else {
-      Rule::opaque_row(loops, to + start, from + start, piece);
+      rule.opaque(from + start, piece, to + start);
     }
   }
-#endif
 }
 
-struct Paste {
-  static void opaque_row(const kel::CompositeRowLoops &loops, uint8_t *to, const uint8_t *from,
-                         size_t count) {
-    copy_forward(loops, to, from, count);
-  }
-  static kel::KeyedRowLoop keyed_loop(const kel::CompositeRowLoops &loops) {
-    return loops.paste_with_key;
-  }
-};
-
-struct Blend {
-  static void opaque_row(const kel::CompositeRowLoops &loops, uint8_t *to, const uint8_t *from,
-                         size_t count) {
-    row_loop(kel::plain::blend_row, loops.blend, to, from, count)(from, count, to);
-  }
-  static kel::KeyedRowLoop keyed_loop(const kel::CompositeRowLoops &loops) {
-    return loops.blend_with_key;
-  }
-};
-
-// The one walker of paste and blend: clip once, then visit the visible rows top to bottom.
-template <class Rule>
-void composite(uint8_t *dst, int32_t dst_height, int32_t dst_width, const uint8_t *src,
-               uint16_t src_height, uint16_t src_width, int32_t x, int32_t y, uint16_t key) {
+// The one walker of paste and blend: clip once, then visit the visible rows top to bottom. A row
+// whose destination starts inside its source takes the in-order loops, and its keyed pixels one
+// loop.
+void composite(const Compositing &rules, uint8_t *dst, int32_t dst_height, int32_t dst_width,
+               const uint8_t *src, uint16_t src_height, uint16_t src_width, int32_t x, int32_t y,
+               uint16_t key) {
   const VisibleRect rect = visible_rect(dst_height, dst_width, src_height, src_width, x, y);
   if (rect.empty()) return;
-  const kel::CompositeRowLoops loops = kel::simd::composite_row_loops();
   const size_t count = static_cast<size_t>(rect.last_col - rect.first_col + 1);
   for (int64_t row = rect.first_row; row <= rect.last_row; ++row) {
     // Both offsets lie inside their rasters, which the caller sized, so they fit ptrdiff_t.
     const uint8_t *from = src + static_cast<ptrdiff_t>(row * src_width + rect.first_col);
     uint8_t *to = dst + static_cast<ptrdiff_t>((y + row) * dst_width + x + rect.first_col);
+    const bool overlapping = starts_inside(to, from, count);
+    const RowRule &rule = overlapping ? rules.in_order : rules.fast;
     if (key > 255) {
-      Rule::opaque_row(loops, to, from, count);
+      rule.opaque(from, count, to);
     } else {
-      keyed_row<Rule>(loops, to, from, count, static_cast<uint8_t>(key));
+      keyed_row(rule, to, from, count, static_cast<uint8_t>(key),
+                !overlapping && !kKeyedLoopsAreVectors);
     }
   }
 }
@@ -225,8 +225,13 @@ ColumnRange hole_columns(const uint8_t *mask_row, size_t width) {
   return {first, first + kel::simd::end_of_last_zero(mask_row + first, width - first)};
 }
 
-// Interior columns classified together; a piece's windows take about 1 KiB of stack.
+// Interior columns classified together; a piece's windows and values take about 3 bytes of stack
+// per column, so builds for size (MinSizeRel, as for microcontrollers) take shorter pieces.
+#if KEL_SMALL_BUILD
+constexpr size_t kEdgePiece = 128;
+#else
 constexpr size_t kEdgePiece = 256;
+#endif
 
 // Which extreme of each pixel's 3 x 3 window of mask values is taken. A border pixel (known, a
 // hole among its neighbours) has a window minimum of 0, a seam pixel (a hole, a known
@@ -243,41 +248,56 @@ struct WindowPiece {
   uint8_t extreme[kEdgePiece];
 };
 
-template <Extreme kWhich>
-uint8_t extreme3(uint8_t a, uint8_t b, uint8_t c) {
-  return kWhich == Extreme::kSmallest ? min3(a, b, c) : max3(a, b, c);
+// out[i] = the chosen extreme of a[i], b[i] and c[i]. Each loop is left without branches, so that
+// it vectorises.
+void extremes_of_three(Extreme which, const uint8_t *a, const uint8_t *b, const uint8_t *c,
+                       size_t count, uint8_t *out) {
+  if (which == Extreme::kSmallest) {
+    for (size_t i = 0; i < count; ++i) out[i] = min3(a[i], b[i], c[i]);
+  } else {
+    for (size_t i = 0; i < count; ++i) out[i] = max3(a[i], b[i], c[i]);
+  }
 }
 
 // Fills `piece` for columns first .. first + count - 1 of row y; returns false, leaving the
 // windows unset, when the piece can hold no border pixel (no window holds a hole) or no seam
 // pixel (no pixel is a hole).
-template <Extreme kWhich>
-bool look_at_windows(const uint8_t *mask, size_t width, size_t y, size_t first, size_t count,
-                     WindowPiece &piece) {
+bool look_at_windows(Extreme which, const uint8_t *mask, size_t width, size_t y, size_t first,
+                     size_t count, WindowPiece &piece) {
   uint8_t column_extreme[kEdgePiece + 2];
   const uint8_t *above = mask + (y - 1) * width + (first - 1);
   const uint8_t *row = above + width;
   const uint8_t *below = row + width;
   const size_t span = count + 2;
-  if (kWhich == Extreme::kLargest && !holds(row + 1, count, 0)) return false;
-  for (size_t i = 0; i < span; ++i)
-    column_extreme[i] = extreme3<kWhich>(above[i], row[i], below[i]);
-  if (kWhich == Extreme::kSmallest && !holds(column_extreme, span, 0)) return false;
-  for (size_t i = 0; i < count; ++i) {
-    piece.extreme[i] =
-        extreme3<kWhich>(column_extreme[i], column_extreme[i + 1], column_extreme[i + 2]);
-  }
+  if (which == Extreme::kLargest && !holds(row + 1, count, 0)) return false;
+  extremes_of_three(which, above, row, below, span, column_extreme);
+  if (which == Extreme::kSmallest && !holds(column_extreme, span, 0)) return false;
+  extremes_of_three(which, column_extreme, column_extreme + 1, column_extreme + 2, count,
+                    piece.extreme);
   piece.first = first;
   piece.count = count;
   return true;
 }
 
-// Calls visit(y, piece) for the pieces of interior rows whose windows hold a hole, rows top to
-// bottom. Only the columns whose windows reach between the first and last hole of the three
+// The rasters of one fill, as the steps that visit window pieces read and write them.
+struct FillRasters {
+  const uint8_t *src, *mask;
+  uint16_t height, width;
+  uint8_t *grid;
+  uint16_t grid_width;
+  const uint8_t *blurred;
+  uint8_t *dst;
+};
+
+using PieceVisit = void (*)(const FillRasters &fill, size_t y, const WindowPiece &piece);
+
+// Calls visit(fill, y, piece) for the pieces of interior rows whose windows hold a hole, rows top
+// to bottom. Only the columns whose windows reach between the first and last hole of the three
 // rows are looked at. Pieces end at multiples of kEdgePiece, so no 8-pixel cell straddles two
 // of them.
-template <Extreme kWhich, class Visit>
-void for_each_window_piece(const uint8_t *mask, uint16_t height, uint16_t width, Visit visit) {
+void for_each_window_piece(Extreme which, const FillRasters &fill, PieceVisit visit) {
+  const uint8_t *const mask = fill.mask;
+  const size_t height = fill.height, width = fill.width;
   if (height <= 2 || width <= 2) return;
   ColumnRange above = hole_columns(mask, width);
   ColumnRange row = hole_columns(mask + width, width);
@@ -290,23 +310,15 @@ void for_each_window_piece(const uint8_t *mask, uint16_t height, uint16_t width,
     if (holes.empty()) continue;
     // Interior columns x with a hole among x - 1 .. x + 1.
     const size_t start = holes.first > 1 ? holes.first - 1 : 1;
-    const size_t end = holes.end + 1 < size_t{width} - 1 ? holes.end + 1 : size_t{width} - 1;
+    const size_t end = holes.end + 1 < width - 1 ? holes.end + 1 : width - 1;
     for (size_t first = start; first < end;) {
       const size_t piece_end = (first / kEdgePiece + 1) * kEdgePiece;
       const size_t last_end = piece_end < end ? piece_end : end;
-      if (look_at_windows<kWhich>(mask, width, y, first, last_end - first, piece)) {
-        visit(y, piece);
+      if (look_at_windows(which, mask, width, y, first, last_end - first, piece)) {
+        visit(fill, y, piece);
       }
       first = last_end;
     }
-  }
-}
-
-// dst[i] takes from[i] where take[i] is 0xFF and keeps its value where it is 0. Written as a
-// bitwise blend, not a branch, so that the loop vectorises.
-void select_bytes(const uint8_t *take, const uint8_t *from, size_t count, uint8_t *dst) {
-  for (size_t i = 0; i < count; ++i) {
-    dst[i] = static_cast<uint8_t>((from[i] & take[i]) | (dst[i] & ~take[i]));
   }
 }
 
@@ -315,76 +327,74 @@ uint8_t all_or_none(bool condition) {
   return static_cast<uint8_t>(condition ? 0xFF : 0);
 }
 
+// `from` where take holds, else `keep`. Written as a bitwise blend, not a branch, so that loops
+// of it vectorise.
+uint8_t chosen(bool take, uint8_t from, uint8_t keep) {
+  const uint8_t taken = all_or_none(take);
+  return static_cast<uint8_t>((from & taken) | (keep & ~taken));
+}
+
 // Each cell takes the largest source value among its border pixels (known pixels next to the
 // hole); a value of 0 leaves it empty. A piece's border values are set out first, 0 elsewhere,
 // from the start of the piece's first cell, and then each cell with a nonzero value among its
 // eight takes the largest; border pixels are few, so most cells are passed over a word at a
 // time.
-void gather_edge_values(const uint8_t *src, const uint8_t *mask, uint16_t height, uint16_t width,
-                        uint8_t *grid, uint16_t grid_width) {
+void gather_edge_values(const FillRasters &fill, size_t y, const WindowPiece &piece) {
   // Pieces lie inside one kEdgePiece-aligned block of columns, so a piece with the lead to its
   // first cell's start fits.
   uint8_t border_values[kEdgePiece];
-  for_each_window_piece<Extreme::kSmallest>(
-      mask, height, width, [&](size_t y, const WindowPiece &piece) {
-        const size_t offset = y * width + piece.first;
-        const uint8_t *mask_row = mask + offset;
-        const uint8_t *src_row = src + offset;
-        const size_t lead = piece.first & (kBlockSide - 1);
-        const size_t used = lead + piece.count;
-        const size_t padded = (used + kBlockSide - 1) & ~size_t{kBlockSide - 1};
-        std::memset(border_values, 0, lead);
-        std::memset(border_values + used, 0, padded - used);
-        uint8_t *values = border_values + lead;
-        for (size_t i = 0; i < piece.count; ++i) {
-          const bool border = is_known(mask_row[i]) & (piece.extreme[i] == 0);
-          values[i] = static_cast<uint8_t>(src_row[i] & all_or_none(border));
-        }
-        uint8_t *cells = grid + (y >> 3) * grid_width + (piece.first >> 3);
-        for (size_t i = 0; i < padded; i += kBlockSide) {
-          uint64_t eight;
-          std::memcpy(&eight, border_values + i, sizeof eight);
-          if (eight == 0) continue;
-          uint8_t largest = 0;
-          for (size_t k = 0; k < kBlockSide; ++k) {
-            largest = border_values[i + k] > largest ? border_values[i + k] : largest;
-          }
-          uint8_t &cell = cells[i / kBlockSide];
-          if (cell < largest) cell = largest;
-        }
-      });
+  const size_t offset = y * fill.width + piece.first;
+  const uint8_t *mask_row = fill.mask + offset;
+  const uint8_t *src_row = fill.src + offset;
+  const size_t lead = piece.first & (kBlockSide - 1);
+  const size_t used = lead + piece.count;
+  const size_t padded = (used + kBlockSide - 1) & ~size_t{kBlockSide - 1};
+  std::memset(border_values, 0, lead);
+  std::memset(border_values + used, 0, padded - used);
+  uint8_t *values = border_values + lead;
+  for (size_t i = 0; i < piece.count; ++i) {
+    const bool border = is_known(mask_row[i]) & (piece.extreme[i] == 0);
+    values[i] = static_cast<uint8_t>(src_row[i] & all_or_none(border));
+  }
+  uint8_t *cells = fill.grid + (y >> 3) * fill.grid_width + (piece.first >> 3);
+  for (size_t i = 0; i < padded; i += kBlockSide) {
+    uint64_t eight;
+    std::memcpy(&eight, border_values + i, sizeof eight);
+    if (eight == 0) continue;
+    uint8_t largest = 0;
+    for (size_t k = 0; k < kBlockSide; ++k) {
+      largest = border_values[i + k] > largest ? border_values[i + k] : largest;
+    }
+    uint8_t &cell = cells[i / kBlockSide];
+    if (cell < largest) cell = largest;
+  }
 }
 
 // Every hole pixel, edge rows and columns included, takes the enlarged surface. Only the
 // stretch of each row between its first and last hole is looked at.
 void fill_holes(const uint8_t *mask, uint16_t height, uint16_t width, const uint8_t *enlarged,
                 uint16_t enlarged_width, uint8_t *dst) {
-  uint8_t take[kEdgePiece];
   for (size_t y = 0; y < height; ++y) {
     const uint8_t *mask_row = mask + y * width;
+    const uint8_t *from = enlarged + y * enlarged_width;
+    uint8_t *row = dst + y * width;
     const ColumnRange holes = hole_columns(mask_row, width);
-    for (size_t first = holes.first; first < holes.end; first += kEdgePiece) {
-      const size_t count = holes.end - first < kEdgePiece ? holes.end - first : kEdgePiece;
-      for (size_t i = 0; i < count; ++i) take[i] = all_or_none(is_hole(mask_row[first + i]));
-      select_bytes(take, enlarged + y * enlarged_width + first, count, dst + y * width + first);
+    for (size_t x = holes.first; x < holes.end; ++x) {
+      row[x] = chosen(is_hole(mask_row[x]), from[x], row[x]);
     }
   }
 }
 
 // The seam (interior hole pixels next to kept ones) takes the blurred result. The blurred raster
 // is a separate buffer, so the order of these writes does not matter.
-void soften_seam(const uint8_t *mask, uint16_t height, uint16_t width, const uint8_t *blurred,
-                 uint8_t *dst) {
-  uint8_t take[kEdgePiece];
-  for_each_window_piece<Extreme::kLargest>(
-      mask, height, width, [&](size_t y, const WindowPiece &piece) {
-        const size_t offset = y * width + piece.first;
-        const uint8_t *mask_row = mask + offset;
-        for (size_t i = 0; i < piece.count; ++i) {
-          take[i] = all_or_none(is_hole(mask_row[i]) & (piece.extreme[i] != 0));
-        }
-        select_bytes(take, blurred + offset, piece.count, dst + offset);
-      });
+void soften_seam(const FillRasters &fill, size_t y, const WindowPiece &piece) {
+  const size_t offset = y * fill.width + piece.first;
+  const uint8_t *mask_row = fill.mask + offset;
+  const uint8_t *from = fill.blurred + offset;
+  uint8_t *row = fill.dst + offset;
+  for (size_t i = 0; i < piece.count; ++i) {
+    row[i] = chosen(is_hole(mask_row[i]) & (piece.extreme[i] != 0), from[i], row[i]);
+  }
 }
 
 // The dilation passes, computed in two sweeps. A pass fills the empty cells next to cells
@@ -485,7 +495,9 @@ void fill_masked(const uint8_t *src, uint16_t height, uint16_t width, const uint
 
   if (dst != src && pixels != 0) std::memcpy(dst, src, pixels);
   std::memset(scratch.current, 0, size_t{grid_height} * grid_width);
-  gather_edge_values(src, mask, height, width, scratch.current, grid_width);
+  const FillRasters fill{src, mask, height, width, scratch.current, grid_width, scratch.blurred,
+                         dst};
+  for_each_window_piece(Extreme::kSmallest, fill, gather_edge_values);
   // The enlarged raster, 64 bytes per cell, is not needed until the enlargement writes it: it
   // holds the sweeps' keys meanwhile.
   dilate_until_full(scratch.current, grid_height, grid_width,
@@ -497,7 +509,7 @@ void fill_masked(const uint8_t *src, uint16_t height, uint16_t width, const uint
 
   fill_holes(mask, height, width, scratch.enlarged, big_width, dst);
   kel_blur_uint8(dst, height, width, scratch.blurred);
-  soften_seam(mask, height, width, scratch.blurred, dst);
+  for_each_window_piece(Extreme::kLargest, fill, soften_seam);
 }
 
 }  // namespace
@@ -582,13 +594,15 @@ void kel_get_mask(const uint8_t *src, uint32_t height, uint32_t width, int32_t k
 void kel_image_draw_image(uint8_t *dst, int32_t dst_height, int32_t dst_width, const uint8_t *src,
                           uint16_t src_height, uint16_t src_width, int32_t x, int32_t y,
                           uint16_t key) {
-  composite<Paste>(dst, dst_height, dst_width, src, src_height, src_width, x, y, key);
+  composite(paste_rules(kel::simd::composite_row_loops()), dst, dst_height, dst_width, src,
+            src_height, src_width, x, y, key);
 }
 
 void kel_image_blend_image(uint8_t *dst, int32_t dst_height, int32_t dst_width, const uint8_t *src,
                            uint16_t src_height, uint16_t src_width, int32_t x, int32_t y,
                            uint16_t key) {
-  composite<Blend>(dst, dst_height, dst_width, src, src_height, src_width, x, y, key);
+  composite(blend_rules(kel::simd::composite_row_loops()), dst, dst_height, dst_width, src,
+            src_height, src_width, x, y, key);
 }
 
 void kel_mask_image(const uint8_t *src, uint16_t height, uint16_t width, const uint8_t *mask,

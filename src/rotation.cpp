@@ -7,6 +7,7 @@
 
 #include "kel_images.h"
 #include "outside/kel_outside.h"
+#include "wide_division.h"
 #if KEL_USE_HIGHWAY
 #include "simd/rotation_simd.h"
 #endif
@@ -20,31 +21,21 @@ constexpr int64_t kFractionMask = kOne - 1;
 
 // A conforming math library stays inside [-1, 1]; clamping keeps a broken one from pushing the
 // products below out of range.
-int64_t clamped_trig(int32_t value) {
-  return value < -kOne ? -kOne : (value > kOne ? kOne : int64_t{value});
+int32_t clamped_trig(int32_t value) {
+  constexpr int32_t one = static_cast<int32_t>(kOne);
+  return value < -one ? -one : (value > one ? one : value);
 }
 
+// Cosine and sine fit 32 bits; the products with positions and sides are taken in 64.
 struct Turn {
-  int64_t cos, sin;
+  int32_t cos, sin;
 };
 
 // The order of these two calls is part of the routine's observable behaviour.
 Turn turn_by(uint8_t angle) {
-  const int64_t cos = clamped_trig(tq_cos_(angle));
-  const int64_t sin = clamped_trig(tq_sin_(angle));
+  const int32_t cos = clamped_trig(tq_cos_(angle));
+  const int32_t sin = clamped_trig(tq_sin_(angle));
   return {cos, sin};
-}
-
-int64_t min4(int64_t a, int64_t b, int64_t c, int64_t d) {
-  const int64_t ab = a < b ? a : b;
-  const int64_t cd = c < d ? c : d;
-  return ab < cd ? ab : cd;
-}
-
-int64_t max4(int64_t a, int64_t b, int64_t c, int64_t d) {
-  const int64_t ab = a > b ? a : b;
-  const int64_t cd = c > d ? c : d;
-  return ab > cd ? ab : cd;
 }
 
 // The canvas that holds the turned corners (0, 0), (W, 0), (0, H) and (W, H), plus one row and
@@ -55,16 +46,19 @@ struct CanvasGeometry {
 };
 
 CanvasGeometry turned_canvas(int64_t height, int64_t width, Turn a) {
-  // C++ division truncates toward zero, so a negative extent shrinks toward 0 like a positive one.
-  const int64_t x1 = a.cos * width / kOne;
-  const int64_t x2 = -(a.sin * height / kOne);
-  const int64_t x3 = (a.cos * width - a.sin * height) / kOne;
-  const int64_t y1 = a.sin * width / kOne;
-  const int64_t y2 = a.cos * height / kOne;
-  const int64_t y3 = (a.sin * width + a.cos * height) / kOne;
-  const int64_t x_min = min4(0, x1, x2, x3);
-  const int64_t y_min = min4(0, y1, y2, y3);
-  return {max4(0, y1, y2, y3) - y_min + 1, max4(0, x1, x2, x3) - x_min + 1, -y_min, -x_min};
+  // The corner (0, 0) stays put; the other three turn. C++ division truncates toward zero, so a
+  // negative extent shrinks toward 0 like a positive one.
+  const int64_t corners[3][2] = {{width, 0}, {0, height}, {width, height}};
+  int64_t x_min = 0, x_max = 0, y_min = 0, y_max = 0;
+  for (const auto &corner : corners) {
+    const int64_t x = (int64_t{a.cos} * corner[0] - int64_t{a.sin} * corner[1]) / kOne;
+    const int64_t y = (int64_t{a.sin} * corner[0] + int64_t{a.cos} * corner[1]) / kOne;
+    x_min = x < x_min ? x : x_min;
+    x_max = x > x_max ? x : x_max;
+    y_min = y < y_min ? y : y_min;
+    y_max = y > y_max ? y : y_max;
+  }
+  return {y_max - y_min + 1, x_max - x_min + 1, -y_min, -x_min};
 }
 
 // Sides that the int32_t outputs can carry and a byte count that malloc can be asked for.
@@ -74,15 +68,23 @@ bool representable(const CanvasGeometry &g) {
   return bytes <= SIZE_MAX;
 }
 
-// Floor and ceiling of a / b for b > 0 (C++ division alone truncates toward zero).
-int64_t floor_div(int64_t a, int64_t b) {
-  const int64_t q = a / b;
-  return (a % b != 0 && a < 0) ? q - 1 : q;
+// Floor and ceiling of a / b for 0 < b, from the quotient and remainder of |a| / b
+// (C++ division alone truncates toward zero).
+kel::WideQuotient divide_magnitude(int64_t a, int32_t b) {
+  const uint64_t magnitude = a < 0 ? 0 - static_cast<uint64_t>(a) : static_cast<uint64_t>(a);
+  return kel::divide_wide(magnitude, static_cast<uint32_t>(b));
 }
 
-int64_t ceil_div(int64_t a, int64_t b) {
-  const int64_t q = a / b;
-  return (a % b != 0 && a > 0) ? q + 1 : q;
+int64_t floor_div(int64_t a, int32_t b) {
+  const kel::WideQuotient q = divide_magnitude(a, b);
+  const auto whole = static_cast<int64_t>(q.quotient);
+  return a < 0 ? -whole - (q.remainder != 0 ? 1 : 0) : whole;
+}
+
+int64_t ceil_div(int64_t a, int32_t b) {
+  const kel::WideQuotient q = divide_magnitude(a, b);
+  const auto whole = static_cast<int64_t>(q.quotient);
+  return a < 0 ? -whole : whole + (q.remainder != 0 ? 1 : 0);
 }
 
 // Half-open column range [first, last) of a canvas row.
@@ -90,18 +92,18 @@ struct Span {
   int64_t first, last;
 };
 
-// The columns k of [0, columns) whose position slope * k + start lies in [low, high). The
+// The columns k of [0, columns) whose position slope * k + start lies in [0, high). The
 // position is linear in k, so they form one run.
-Span columns_inside(int64_t slope, int64_t start, int64_t low, int64_t high, int64_t columns) {
+Span columns_inside(int32_t slope, int64_t start, int64_t high, int64_t columns) {
   Span span{0, columns};
-  if (low >= high) return {0, 0};
-  if (slope == 0) return (low <= start && start < high) ? span : Span{0, 0};
+  if (high <= 0) return {0, 0};
+  if (slope == 0) return (0 <= start && start < high) ? span : Span{0, 0};
   if (slope > 0) {
-    span.first = ceil_div(low - start, slope);
+    span.first = ceil_div(-start, slope);
     span.last = floor_div(high - 1 - start, slope) + 1;
   } else {
     span.first = ceil_div(start - (high - 1), -slope);
-    span.last = floor_div(start - low, -slope) + 1;
+    span.last = floor_div(start, -slope) + 1;
   }
   if (span.first < 0) span.first = 0;
   if (span.last > columns) span.last = columns;
@@ -183,10 +185,62 @@ struct SignedNearest {
 #endif
 };
 
-// Maps every canvas pixel back through the opposite turn and resamples the source there. The
-// position is linear along a row, so each row first finds the run of columns whose position is
-// inside the source and then steps through it by (cos, sin); pixels outside keep the fill and are
-// not visited. Stepping is exact integer algebra, so the positions equal those computed afresh.
+// The canvas, every pixel set to the fill; null when malloc fails.
+void *allocate_canvas(size_t bytes, uint8_t fill) {
+  void *block = std::malloc(bytes);
+  if (block != nullptr) std::memset(block, fill, bytes);
+  return block;
+}
+
+// A new canvas for the turn by angle, its geometry and the opposite turn that maps it back.
+struct Canvas {
+  void *pixels;
+  CanvasGeometry geometry;
+  Turn opposite;
+};
+
+// Canvas geometry, allocation and fill. The four sizes and offsets are written before any pixel is
+// resampled; when no canvas can be made they are 0 and the opposite turn is not asked for.
+Canvas new_canvas(int64_t height, int64_t width, uint8_t angle, uint8_t fill,
+                  int32_t *canvas_height, int32_t *canvas_width, int32_t *offset_y,
+                  int32_t *offset_x) {
+  Canvas c{nullptr, turned_canvas(height, width, turn_by(angle)), {0, 0}};
+  const CanvasGeometry &g = c.geometry;
+  if (!representable(g)) {
+    *canvas_height = *canvas_width = *offset_y = *offset_x = 0;
+    return c;
+  }
+  c.pixels = allocate_canvas(static_cast<size_t>(g.height) * static_cast<size_t>(g.width), fill);
+  *canvas_height = static_cast<int32_t>(g.height);
+  *canvas_width = static_cast<int32_t>(g.width);
+  *offset_y = static_cast<int32_t>(g.offset_y);
+  *offset_x = static_cast<int32_t>(g.offset_x);
+  if (c.pixels != nullptr) c.opposite = turn_by(static_cast<uint8_t>(-angle & 255));
+  return c;
+}
+
+// The columns [first, last) of canvas row r whose position, mapped back through the opposite
+// turn b, has a whole part in [0, side - reach) on both axes, and the position of column first.
+// The position is linear along a row, so they form one run, stepped through by (cos, sin).
+struct RowRun {
+  int64_t first, last, x, y;
+};
+
+RowRun row_run(const CanvasGeometry &g, Turn b, int64_t r, int64_t x_high, int64_t y_high) {
+  const int64_t dy = r - g.offset_y;
+  // Source position of canvas column 0 of this row.
+  const int64_t sx0 = -int64_t{b.cos} * g.offset_x - int64_t{b.sin} * dy;
+  const int64_t sy0 = -int64_t{b.sin} * g.offset_x + int64_t{b.cos} * dy;
+  const Span in_x = columns_inside(b.cos, sx0, x_high, g.width);
+  const Span in_y = columns_inside(b.sin, sy0, y_high, g.width);
+  const int64_t first = in_x.first > in_y.first ? in_x.first : in_y.first;
+  const int64_t last = in_x.last < in_y.last ? in_x.last : in_y.last;
+  return {first, last, sx0 + int64_t{b.cos} * first, sy0 + int64_t{b.sin} * first};
+}
+
+// Maps every canvas pixel back through the opposite turn and resamples the source there. Each
+// row visits only its run of columns inside the source; pixels outside keep the fill. Stepping is
+// exact integer algebra, so the positions equal those computed afresh.
 template <typename Policy>
 void resample_canvas(const Source<typename Policy::Pixel> &src, const CanvasGeometry &g, Turn b,
                      typename Policy::Pixel *canvas) {
@@ -200,68 +254,44 @@ void resample_canvas(const Source<typename Policy::Pixel> &src, const CanvasGeom
                        src.width * src.height < (int64_t{1} << 31) && src.width * src.height >= 4;
 #endif
   for (int64_t r = 0; r < g.height; ++r) {
-    const int64_t dy = r - g.offset_y;
-    // Source position of canvas column 0 of this row.
-    const int64_t sx0 = -b.cos * g.offset_x - b.sin * dy;
-    const int64_t sy0 = -b.sin * g.offset_x + b.cos * dy;
-    const Span in_x = columns_inside(b.cos, sx0, 0, x_high, g.width);
-    const Span in_y = columns_inside(b.sin, sy0, 0, y_high, g.width);
-    const int64_t first = in_x.first > in_y.first ? in_x.first : in_y.first;
-    const int64_t last = in_x.last < in_y.last ? in_x.last : in_y.last;
-    if (first >= last) continue;
+    RowRun run = row_run(g, b, r, x_high, y_high);
+    if (run.first >= run.last) continue;
     typename Policy::Pixel *out = canvas + static_cast<size_t>(r) * static_cast<size_t>(g.width);
-    int64_t k = first;
-    int64_t sx = sx0 + b.cos * first;
-    int64_t sy = sy0 + b.sin * first;
 #if KEL_USE_HIGHWAY
     if (vectors) {
-      const kel::simd::RotationRow run{src.pixels,
+      const kel::simd::RotationRow row{src.pixels,
                                        static_cast<int32_t>(src.height),
                                        static_cast<int32_t>(src.width),
-                                       static_cast<int32_t>(sx),
-                                       static_cast<int32_t>(sy),
-                                       static_cast<int32_t>(b.cos),
-                                       static_cast<int32_t>(b.sin),
-                                       static_cast<size_t>(last - first)};
-      const auto done = static_cast<int64_t>(Policy::resample_run(run, out + first));
-      k += done;
-      sx += b.cos * done;
-      sy += b.sin * done;
+                                       static_cast<int32_t>(run.x),
+                                       static_cast<int32_t>(run.y),
+                                       b.cos,
+                                       b.sin,
+                                       static_cast<size_t>(run.last - run.first)};
+      const auto done = static_cast<int64_t>(Policy::resample_run(row, out + run.first));
+      run.first += done;
+      run.x += b.cos * done;
+      run.y += b.sin * done;
     }
 #endif
-    for (; k < last; ++k, sx += b.cos, sy += b.sin) {
-      out[k] = Policy::resample(src, sx >> kFractionBits, sy >> kFractionBits,
-                                static_cast<int32_t>(sx & kFractionMask),
-                                static_cast<int32_t>(sy & kFractionMask));
+    for (; run.first < run.last; ++run.first, run.x += b.cos, run.y += b.sin) {
+      out[run.first] = Policy::resample(src, run.x >> kFractionBits, run.y >> kFractionBits,
+                                        static_cast<int32_t>(run.x & kFractionMask),
+                                        static_cast<int32_t>(run.y & kFractionMask));
     }
   }
 }
 
-// Canvas geometry, allocation and fill, then the inverse mapping. All five outputs are written
-// before any pixel is resampled; when no canvas can be made the opposite turn is not asked for.
 template <typename Policy>
 void rotate(const typename Policy::Pixel *pixels, int64_t height, int64_t width, uint8_t angle,
             typename Policy::Pixel **canvas, int32_t *canvas_height, int32_t *canvas_width,
             int32_t *offset_y, int32_t *offset_x) {
   using Pixel = typename Policy::Pixel;
-  const CanvasGeometry g = turned_canvas(height, width, turn_by(angle));
-  if (!representable(g)) {
-    *canvas = nullptr;
-    *canvas_height = *canvas_width = *offset_y = *offset_x = 0;
-    return;
-  }
-  const size_t bytes = static_cast<size_t>(g.height) * static_cast<size_t>(g.width);
-  Pixel *block = static_cast<Pixel *>(std::malloc(bytes));
-  *canvas = block;
-  *canvas_height = static_cast<int32_t>(g.height);
-  *canvas_width = static_cast<int32_t>(g.width);
-  *offset_y = static_cast<int32_t>(g.offset_y);
-  *offset_x = static_cast<int32_t>(g.offset_x);
-  if (block == nullptr) return;
-  const Pixel fill = Policy::kFill;
-  std::memset(block, static_cast<unsigned char>(fill), bytes);
-  const Turn opposite = turn_by(static_cast<uint8_t>(-angle & 255));
-  resample_canvas<Policy>(Source<Pixel>{pixels, height, width}, g, opposite, block);
+  const Canvas c = new_canvas(height, width, angle, static_cast<uint8_t>(Policy::kFill),
+                              canvas_height, canvas_width, offset_y, offset_x);
+  *canvas = static_cast<Pixel *>(c.pixels);
+  if (c.pixels == nullptr) return;
+  resample_canvas<Policy>(Source<Pixel>{pixels, height, width}, c.geometry, c.opposite,
+                          static_cast<Pixel *>(c.pixels));
 }
 
 }  // namespace

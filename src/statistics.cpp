@@ -12,6 +12,7 @@
 namespace kel {
 namespace plain {
 
+#if KEL_USE_HIGHWAY
 // A run of one value would make every increment wait for the store of the one before, so
 // consecutive pixels go to four histograms in turn -- the caller's and three on the stack (3 KiB
 // at most) -- that are summed at the end. Eight pixels are read as one word, so the stores to
@@ -45,6 +46,16 @@ void count_top_bits(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32
   // No bin can overflow: count is below 2^31.
   for (uint32_t bin = 0; bin < bins; ++bin) hist[bin] += lane1[bin] + lane2[bin] + lane3[bin];
 }
+#else
+// Without the vector variants, as on microcontrollers whose whole stack may be a few KiB, the
+// three extra histograms above would be the largest stack of the library: one count per pixel,
+// straight into the caller's bins.
+void count_top_bits(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *hist) {
+  const uint32_t shift = 8 - bits;
+  std::memset(hist, 0, sizeof *hist << bits);
+  for (uint32_t i = 0; i < count; ++i) ++hist[pixels[i] >> shift];
+}
+#endif
 
 PixelSums pixel_sums(const uint8_t *pixels, uint32_t count) {
   PixelSums sums{0, 0};

@@ -13,6 +13,14 @@
 #include "image_filters_simd.h"
 #include "kel_outside.h"
 
+// A build for size (MinSizeRel, as for microcontrollers) keeps shorter strips on the stack and
+// leaves out the one-sweep blur, which only makes a call faster.
+#if KEL_SMALL_BUILD
+constexpr bool kSmallBuild = true;
+#else
+constexpr bool kSmallBuild = false;
+#endif
+
 namespace kel {
 namespace outside {
 namespace {
@@ -26,7 +34,7 @@ size_t strip_length(size_t start, size_t total, size_t strip) {
 // ---------------------------------------------------------------------------------------------
 
 // Columns handled at a time where a pass needs a copy of its input on the stack.
-constexpr size_t kBlurStrip = 256;
+constexpr size_t kBlurStrip = kSmallBuild ? 128 : 256;
 
 // (a + 2b + c + 2) >> 2: each pass rounds half up, so a constant raster stays constant. It is
 // taken as two 8-bit averages, which vector units do in one instruction each. With
@@ -72,6 +80,7 @@ void smooth_down_carrying(uint8_t *above, uint8_t *row, const uint8_t *below, si
 
 namespace {
 
+#if !KEL_SMALL_BUILD
 // The horizontal pass of one row, handed column by column to `column(x, smoothed)`; the first
 // and last columns are their own outer neighbours.
 template <typename Column>
@@ -125,6 +134,8 @@ void blur_apart(const FilterLoops &loops, const uint8_t *in, size_t height, size
   });
 }
 
+#endif
+
 // In place: the horizontal pass row by row, each strip copied to the stack before it is
 // overwritten, its last original byte carried on as the next strip's left neighbour; then the
 // vertical pass strip by strip down the columns, the original row above carried on the stack.
@@ -162,7 +173,7 @@ void blur_in_place(const FilterLoops &loops, uint8_t *pixels, size_t height, siz
 
 // Output columns handled at a time: 6 bytes of sample position and 4 of blended input rows
 // each, on the stack.
-constexpr size_t kScaleStrip = 256;
+constexpr size_t kScaleStrip = kSmallBuild ? 32 : 256;
 
 // The two input samples an output pixel lies between, and the weight of the second one in
 // 1/256 units (0 .. 255).
@@ -177,13 +188,14 @@ struct Tap {
 // before the first sample or after the last take that sample alone, so output beyond
 // input * factor repeats the edge. The weight is rounded down to 8 fraction bits.
 Tap locate(uint32_t out_index, uint32_t factor, uint32_t in_size) {
-  const int64_t scaled = 2 * int64_t{out_index} + 1 - int64_t{factor};
-  const int64_t span = 2 * int64_t{factor};
+  // Index and factor are below 2^16, so every quantity here fits 32 bits, fraction << 8 too.
+  if (2 * out_index + 1 <= factor) return Tap{0, 0, 0};
+  const uint32_t scaled = 2 * out_index + 1 - factor;
+  const uint32_t span = 2 * factor;
   const uint16_t last = static_cast<uint16_t>(in_size - 1);
-  if (scaled <= 0) return Tap{0, 0, 0};
-  const int64_t first = scaled / span;  // scaled > 0, so this is the floor
+  const uint32_t first = scaled / span;
   if (first >= last) return Tap{last, last, 0};
-  const int64_t fraction = scaled - first * span;
+  const uint32_t fraction = scaled - first * span;
   return Tap{static_cast<uint16_t>(first), static_cast<uint16_t>(first + 1),
              static_cast<uint16_t>((fraction << 8) / span)};
 }
@@ -295,7 +307,7 @@ void scale_up_any(const FilterLoops &loops, const uint8_t *in, uint16_t in_heigh
 
 // Output columns handled at a time: two blended rows of 2 bytes per column and the row's samples
 // spread over a byte per column, on the stack.
-constexpr size_t kScale8Strip = 256;
+constexpr size_t kScale8Strip = kSmallBuild ? 64 : 256;
 
 // One input row blended along the columns, in sixteenths (at most 4080): the 8 output columns
 // 8k + 4 .. 8k + 11 take 16 s[k] + (2j + 1) (s[k + 1] - s[k]), j = 0 .. 7, from the samples
@@ -407,11 +419,17 @@ void scale_up_by_8(const FilterLoops &loops, const uint8_t *in, size_t in_height
 void blur(const FilterLoops &loops, const uint8_t *in, uint16_t height, uint16_t width,
           uint8_t *out) {
   if (height == 0 || width == 0) return;
+#if KEL_SMALL_BUILD
+  // The in-place blur of a copy gives the same bytes without the code of the one-sweep blur.
+  if (in != out) std::memcpy(out, in, size_t{height} * width);
+  blur_in_place(loops, out, height, width);
+#else
   if (in == out) {
     blur_in_place(loops, out, height, width);
   } else {
     blur_apart(loops, in, height, width, out);
   }
+#endif
 }
 
 void scale_up_bilinear(const FilterLoops &loops, const uint8_t *in, uint16_t in_height,

@@ -45,7 +45,7 @@ KEL_OUTSIDE_API void kel_blur_uint8(const uint8_t *in, uint16_t height, uint16_t
  * (i + 1/2) / factor - 1/2; positions before the first or after the last input sample take that
  * sample, which also covers an output larger than input * factor. Weights carry 8 fraction bits
  * (rounded down); the result, 16 fraction bits, is rounded half up. An empty input or a factor
- * of 0 gives an all-0 output. No heap; about 3 KiB of stack. */
+ * of 0 gives an all-0 output. No heap; under 1 KiB of stack. */
 KEL_OUTSIDE_API void kel_scale_up_bilinear_uint8(const uint8_t *in, uint16_t in_height,
                                                  uint16_t in_width, uint16_t factor, uint8_t *out,
                                                  uint16_t out_height, uint16_t out_width);
