@@ -170,17 +170,26 @@ py::array_t<uint32_t> histogram_n(ArrayArgument img, int64_t bits) {
 }
 
 int hist_mean(ArrayArgument hist, int64_t count) {
-  return kel_hist_mean(histogram_bins(hist), narrow<uint32_t>(count, "count"));
+  const uint32_t *bins = histogram_bins(hist);
+  const uint32_t n = narrow<uint32_t>(count, "count");
+  py::gil_scoped_release unlocked;
+  return kel_hist_mean(bins, n);
 }
 
 int hist_var(ArrayArgument hist, int64_t mean, int64_t count) {
-  return kel_hist_var(histogram_bins(hist), narrow<uint8_t>(mean, "mean"),
-                      narrow<uint32_t>(count, "count"));
+  const uint32_t *bins = histogram_bins(hist);
+  const uint8_t m = narrow<uint8_t>(mean, "mean");
+  const uint32_t n = narrow<uint32_t>(count, "count");
+  py::gil_scoped_release unlocked;
+  return kel_hist_var(bins, m, n);
 }
 
 int hist_std(ArrayArgument hist, int64_t mean, int64_t count) {
-  return kel_hist_std(histogram_bins(hist), narrow<uint8_t>(mean, "mean"),
-                      narrow<uint32_t>(count, "count"));
+  const uint32_t *bins = histogram_bins(hist);
+  const uint8_t m = narrow<uint8_t>(mean, "mean");
+  const uint32_t n = narrow<uint32_t>(count, "count");
+  py::gil_scoped_release unlocked;
+  return kel_hist_std(bins, m, n);
 }
 
 py::tuple var(ArrayArgument img) {

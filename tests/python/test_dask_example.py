@@ -4,8 +4,11 @@ import importlib.util
 from pathlib import Path
 
 import numpy as np
+import pytest
 
 import kel_images as k
+
+pytest.importorskip("dask.bag")
 
 SCRIPT = Path(__file__).resolve().parents[2] / "examples" / "dask_pictures.py"
 spec = importlib.util.spec_from_file_location("dask_pictures", SCRIPT)
