@@ -14,6 +14,7 @@ Build both with the release preset first.
 """
 
 import json
+import os
 import statistics
 import subprocess
 import sys
@@ -120,21 +121,26 @@ def hole_mask():
     return mask
 
 
-def threads_against_one(img, calls=24):
-    """Seconds for `calls` rotations on one thread, and split over two threads."""
+def threads_against_one(img, calls=24, rounds=5):
+    """Median seconds for `calls` rotations on one thread, and split over two threads."""
     def work(n):
         for _ in range(n):
             k.rotate(img, 20)
-    start = time.perf_counter()
-    work(calls)
-    one = time.perf_counter() - start
-    pair = [threading.Thread(target=work, args=(calls // 2,)) for _ in range(2)]
-    start = time.perf_counter()
-    for thread in pair:
-        thread.start()
-    for thread in pair:
-        thread.join()
-    return one, time.perf_counter() - start
+
+    def on_threads(count):
+        threads = [threading.Thread(target=work, args=(calls // count,)) for _ in range(count)]
+        start = time.perf_counter()
+        for thread in threads:
+            thread.start()
+        for thread in threads:
+            thread.join()
+        return time.perf_counter() - start
+
+    times = {1: [], 2: []}
+    for _ in range(rounds):  # alternating, so that other work on the machine hits both alike
+        for count in times:
+            times[count].append(on_threads(count))
+    return statistics.median(times[1]), statistics.median(times[2])
 
 
 def main():
@@ -169,7 +175,7 @@ def main():
 
     one, two = threads_against_one(img)
     print(f"\nrotate 20 on 2048 x 1536, 24 calls: one thread {one:.3f} s, two threads {two:.3f} s, "
-          f"{one / two:.2f}x")
+          f"{one / two:.2f}x; load average {os.getloadavg()[0]:.1f} on {os.cpu_count()} cores")
 
 
 if __name__ == "__main__":
