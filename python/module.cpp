@@ -224,7 +224,10 @@ struct Rotated {
 
 template <typename Pixel>
 py::tuple canvas_result(const Rotated &rotated) {
-  if (rotated.canvas == nullptr) throw std::bad_alloc();
+  if (rotated.canvas == nullptr) {
+    PyErr_SetString(PyExc_MemoryError, "no memory for the rotated canvas");
+    throw py::error_already_set();
+  }
   py::capsule owner(rotated.canvas, [](void *block) { std::free(block); });
   py::array_t<Pixel> canvas({int64_t{rotated.height}, int64_t{rotated.width}},
                             static_cast<Pixel *>(rotated.canvas), owner);
