@@ -9,7 +9,8 @@ Prints three tables:
 - its time on 2048 x 1536 beside the C benchmark's (Google Benchmark, same routine, same size;
   the C benchmark is run between the module's batches, so that both see the same machine) and
   beside cv2 on one thread where cv2 has the same routine;
-- one thread making 2N rotations against two threads making N each.
+- one thread making 2N rotations against two threads making N each, and how many cores the
+  two kept busy.
 Build both with the release preset first.
 """
 
@@ -122,25 +123,29 @@ def hole_mask():
 
 
 def threads_against_one(img, calls=24, rounds=5):
-    """Median seconds for `calls` rotations on one thread, and split over two threads."""
+    """Median wall seconds for `calls` rotations on one thread and split over two, and the cores
+    the two kept busy (process CPU time over wall time: at most 1 if the GIL were held)."""
     def work(n):
         for _ in range(n):
             k.rotate(img, 20)
 
     def on_threads(count):
         threads = [threading.Thread(target=work, args=(calls // count,)) for _ in range(count)]
-        start = time.perf_counter()
+        start, cpu = time.perf_counter(), time.process_time()
         for thread in threads:
             thread.start()
         for thread in threads:
             thread.join()
-        return time.perf_counter() - start
+        wall = time.perf_counter() - start
+        return wall, (time.process_time() - cpu) / wall
 
-    times = {1: [], 2: []}
+    runs = {1: [], 2: []}
     for _ in range(rounds):  # alternating, so that other work on the machine hits both alike
-        for count in times:
-            times[count].append(on_threads(count))
-    return statistics.median(times[1]), statistics.median(times[2])
+        for count in runs:
+            runs[count].append(on_threads(count))
+    one = statistics.median(wall for wall, _ in runs[1])
+    two = statistics.median(wall for wall, _ in runs[2])
+    return one, two, statistics.median(cores for _, cores in runs[2])
 
 
 def main():
@@ -173,9 +178,10 @@ def main():
             row += " | |"
         print(row, flush=True)
 
-    one, two = threads_against_one(img)
-    print(f"\nrotate 20 on 2048 x 1536, 24 calls: one thread {one:.3f} s, two threads {two:.3f} s, "
-          f"{one / two:.2f}x; load average {os.getloadavg()[0]:.1f} on {os.cpu_count()} cores")
+    one, two, cores = threads_against_one(img)
+    print(f"\nrotate 20 on 2048 x 1536, 24 calls: one thread {one:.3f} s, two threads {two:.3f} s "
+          f"({one / two:.2f}x, {cores:.2f} cores busy); load average {os.getloadavg()[0]:.1f} "
+          f"on {os.cpu_count()} cores")
 
 
 if __name__ == "__main__":
