@@ -5,6 +5,7 @@ backend is setuptools, and CMake compiles the library and the extension together
 """
 
 import os
+import re
 import subprocess
 import sys
 from pathlib import Path
@@ -13,6 +14,13 @@ from setuptools import Extension, setup
 from setuptools.command.build_ext import build_ext
 
 ROOT = Path(__file__).resolve().parent
+
+
+def library_version():
+    """The version the public header declares, so that the package and the library agree."""
+    header = (ROOT / "include" / "kel_images.h").read_text()
+    return ".".join(re.search(rf"#define KEL_IMAGES_VERSION_{part} (\d+)", header).group(1)
+                    for part in ("MAJOR", "MINOR", "PATCH"))
 
 
 class CMakeBuild(build_ext):
@@ -38,7 +46,7 @@ class CMakeBuild(build_ext):
 
 setup(
     name="kel_images",
-    version="0.1.0",
+    version=library_version(),
     description="Bit-exact integer routines on small greyscale pictures, over numpy",
     packages=["kel_images"],
     package_dir={"": "python"},
