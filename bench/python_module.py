@@ -10,7 +10,7 @@ Prints three tables:
   the C benchmark is run between the module's batches, so that both see the same machine) and
   beside cv2 on one thread where cv2 has the same routine;
 - one thread making 2N rotations against two threads making N each, and how many cores the
-  two kept busy.
+  two kept busy, and how far another Python thread gets during one long call.
 Build both with the release preset first.
 """
 
@@ -148,6 +148,30 @@ def threads_against_one(img, calls=24, rounds=5):
     return one, two, statistics.median(cores for _, cores in runs[2])
 
 
+def progress_beside_a_call(call, alone_seconds=0.1):
+    """How far a pure-Python counting thread gets during one long call, as a share of how far it
+    gets alone in as long. A call that holds the GIL lets it run only at the interpreter's thread
+    switches, every few milliseconds; one that releases it lets it run as far as the cores allow."""
+    state = {"count": 0, "stop": False}
+
+    def count():
+        while not state["stop"]:
+            state["count"] += 1
+
+    counter = threading.Thread(target=count)
+    counter.start()
+    time.sleep(alone_seconds)  # the counter alone
+    start, before = time.perf_counter(), state["count"]
+    time.sleep(alone_seconds)
+    alone_rate = (state["count"] - before) / (time.perf_counter() - start)
+    start, before = time.perf_counter(), state["count"]
+    call()
+    during_rate = (state["count"] - before) / (time.perf_counter() - start)
+    state["stop"] = True
+    counter.join()
+    return during_rate / alone_rate
+
+
 def main():
     kel_bench = sys.argv[1] if len(sys.argv) > 1 else "build/release/bench/kel_bench"
     if not Path(kel_bench).exists():
@@ -182,6 +206,12 @@ def main():
     print(f"\nrotate 20 on 2048 x 1536, 24 calls: one thread {one:.3f} s, two threads {two:.3f} s "
           f"({one / two:.2f}x, {cores:.2f} cores busy); load average {os.getloadavg()[0]:.1f} "
           f"on {os.cpu_count()} cores")
+    big = random_picture(4096, 4096)
+    numbers = list(range(3_000_000))
+    released = progress_beside_a_call(lambda: k.rotate(big, 20))
+    held = progress_beside_a_call(lambda: sorted(numbers, reverse=True))
+    print(f"another thread counted at {released:.2f} of its own pace during a rotate of 4096 x 4096,"
+          f" at {held:.2f} during a sorted() of a list, which holds the GIL")
 
 
 if __name__ == "__main__":
