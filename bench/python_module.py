@@ -210,8 +210,8 @@ def main():
     numbers = list(range(3_000_000))
     released = progress_beside_a_call(lambda: k.rotate(big, 20))
     held = progress_beside_a_call(lambda: sorted(numbers, reverse=True))
-    print(f"another thread counted at {released:.2f} of its own pace during a rotate of 4096 x 4096,"
-          f" at {held:.2f} during a sorted() of a list, which holds the GIL")
+    print(f"another thread counted at {released:.2f} of its own pace during a rotate of "
+          f"4096 x 4096, at {held:.2f} during a sorted() of a list, which holds the GIL")
 
 
 if __name__ == "__main__":
