@@ -17,6 +17,7 @@
 #include <opencv2/imgproc.hpp>
 #include <random>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "kel_images.h"
@@ -58,7 +59,7 @@ struct Timing {
   double ours, theirs;  // seconds per call
 };
 
-Timing time_pair(const std::function<void()> &ours, const std::function<void()> &theirs) {
+Timing time_both(const std::function<void()> &ours, const std::function<void()> &theirs) {
   const int ours_calls = calls_per_batch(ours);
   const int theirs_calls = calls_per_batch(theirs);
   std::vector<double> ours_times, theirs_times;
@@ -72,6 +73,18 @@ Timing time_pair(const std::function<void()> &ours, const std::function<void()> 
   }
   return {median(ours_times), median(theirs_times)};
 }
+
+// The two sides of a row, timed only when the row is wanted.
+struct Pair {
+  std::function<void()> ours, theirs;
+};
+
+Pair time_pair(std::function<void()> ours, std::function<void()> theirs) {
+  return {std::move(ours), std::move(theirs)};
+}
+
+// Rows whose routine's name holds this text (all rows when empty), from the command line.
+std::string row_filter;
 
 // The comparison's verdict: the ratio of the two times, and whether it meets the goal. A goal
 // "at least k times faster" is a ratio theirs / ours >= k; "at most k times memcpy" is
@@ -91,7 +104,9 @@ struct Goals {
   double at(const Size &size) const { return size.large ? large : small; }
 };
 
-void report(const char *routine, const char *against, Timing t, Goal goal, double factor) {
+void report(const char *routine, const char *against, const Pair &pair, Goal goal, double factor) {
+  if (std::string(routine).find(row_filter) == std::string::npos) return;
+  const Timing t = time_both(pair.ours, pair.theirs);
   const bool faster = goal == Goal::kFaster;
   const double ratio = faster ? t.theirs / t.ours : t.ours / t.theirs;
   const bool met = faster ? ratio >= factor : ratio <= factor;
@@ -427,7 +442,9 @@ void compare_drawing() {
 
 }  // namespace
 
-int main() {
+// compare_opencv [text]: only the rows whose routine's name holds the text.
+int main(int argc, char **argv) {
+  if (argc > 1) row_filter = argv[1];
   cv::setNumThreads(1);
   std::printf(
       "One thread; times are microseconds per call, the median of %d batches.\n"
