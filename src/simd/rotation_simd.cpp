@@ -81,18 +81,7 @@ struct NeighbourPairs {
   V32 top, bottom;
 };
 
-template <bool kSigned>
 NeighbourPairs neighbour_pairs(D32 d, V32 words) {
-  if (kSigned) {
-    // Sign-extend each byte from the top of the lane, then keep the left one's low 16 bits.
-    const V32 low_half = hn::Set(d, 0xFFFF);
-    const V32 p00 = hn::ShiftRight<24>(hn::ShiftLeft<24>(words));
-    const V32 p10 = hn::ShiftRight<24>(hn::ShiftLeft<16>(words));
-    const V32 p01 = hn::ShiftRight<24>(hn::ShiftLeft<8>(words));
-    const V32 p11 = hn::ShiftRight<24>(words);
-    return {hn::Or(hn::And(p00, low_half), hn::ShiftLeft<16>(p10)),
-            hn::Or(hn::And(p01, low_half), hn::ShiftLeft<16>(p11))};
-  }
   const V32 byte = hn::Set(d, 0xFF);
   const V32 third_byte = hn::Set(d, 0xFF0000);
   return {hn::Or(hn::And(words, byte), hn::And(hn::ShiftLeft<8>(words), third_byte)),
@@ -123,9 +112,12 @@ V32 bilinear_pixels(D32 d, const NeighbourPairs &pixels, V32 fx, V32 fy) {
   const V32 b = pair_dot(d, fraction_parts, down);
   const V32 floor = hn::ShiftRight<14>(hn::Add(a, hn::ShiftRight<14>(b)));
   if (!kSigned) return floor;  // the total is never negative
+  // The signed pixels were read as s + 128; the weights add up to 2^28, so the total is 128 * 2^28
+  // more than the signed one, and each quotient 128 more.
+  const V32 bias = hn::Set(d, 128);
   const V32 b_up = hn::Add(b, hn::Set(d, (int32_t{1} << 28) - 1));
   const V32 ceiling = hn::ShiftRight<14>(hn::Add(a, hn::ShiftRight<14>(b_up)));
-  return hn::IfThenElse(hn::Lt(floor, hn::Zero(d)), ceiling, floor);
+  return hn::Sub(hn::IfThenElse(hn::Lt(floor, bias), ceiling, floor), bias);
 }
 
 template <typename Pixel>
@@ -143,10 +135,13 @@ size_t bilinear_row(const RotationRow &row, Pixel *out) {
   const V32 advance_x = hn::Set(d, row.step_x * static_cast<int32_t>(lanes));
   const V32 advance_y = hn::Set(d, row.step_y * static_cast<int32_t>(lanes));
   const V32 fraction = hn::Set(d, kFractionMask);
+  const V32 top_bits = hn::Set(d, static_cast<int32_t>(0x80808080u));
   size_t done = 0;
   for (; done + lanes <= row.count; done += lanes) {
     const V32 words = neighbour_words(d, src, pixel_offsets(d, p, row.width), row.width);
-    const NeighbourPairs pixels = neighbour_pairs<kSigned>(d, words);
+    // A signed pixel s is read as the unsigned s + 128 (its top bit flipped), which needs no sign
+    // extension; bilinear_pixels takes the 128 back off.
+    const NeighbourPairs pixels = neighbour_pairs(d, kSigned ? hn::Xor(words, top_bits) : words);
     const V32 values =
         bilinear_pixels<kSigned>(d, pixels, hn::And(p.x, fraction), hn::And(p.y, fraction));
     store_pixels(values, out + done);
