@@ -8,6 +8,7 @@
 #include <hwy/foreach_target.h>  // must come before highway.h
 #include <hwy/highway.h>
 
+#include <cstdint>
 #include <cstring>
 
 HWY_BEFORE_NAMESPACE();
@@ -51,16 +52,33 @@ hn::Vec<D> floor_average(D d, hn::Vec<D> a, hn::Vec<D> b) {
   return hn::Sub(hn::AverageRound(a, b), hn::And(hn::Xor(a, b), hn::Set(d, 1)));
 }
 
-// Runs step(d, i) on whole vectors of the row, full ones and then 16-byte ones for the rest,
-// and returns how many pixels they covered; the plain loop finishes the last few.
-template <class Step>
-size_t for_each_vector(size_t count, Step step) {
-  size_t i = 0;
+// The bytes from `at` to the next multiple of `size` (a power of two) at most `count`.
+size_t bytes_to_boundary(const uint8_t *at, size_t size, size_t count) {
+  const size_t gap = (size - reinterpret_cast<uintptr_t>(at) % size) % size;
+  return gap < count ? gap : count;
+}
+
+// Runs the row through step(d, i), which does the pixels of one vector from i, and plain(i, n),
+// which does pixels i .. i + n - 1 with the plain loop. Full vectors start where the output is on
+// a full vector's boundary: the plain loop and 16-byte vectors lead up to it, and 16-byte vectors
+// and the plain loop finish the row. An aligned store never splits a cache line, and the callers'
+// input and output rows commonly share their alignment, so the loads take whole lines too.
+template <class Step, class Plain>
+void for_each_vector(const uint8_t *out, size_t count, Step step, Plain plain) {
   const D8 d;
-  for (; count - i >= hn::Lanes(d); i += hn::Lanes(d)) step(d, i);
   const hn::CappedTag<uint8_t, 16> d16;
-  for (; count - i >= hn::Lanes(d16); i += hn::Lanes(d16)) step(d16, i);
-  return i;
+  const size_t lanes = hn::Lanes(d), short_lanes = hn::Lanes(d16);
+  // A short row, such as one of a pasted sprite, would spend more on the lead-in than it saves.
+  constexpr size_t kAlignFrom = 4096;
+  size_t i = count >= kAlignFrom ? bytes_to_boundary(out, short_lanes, count) : 0;
+  plain(size_t{0}, i);
+  const size_t lead = count >= kAlignFrom ? i + bytes_to_boundary(out + i, lanes, count - i) : i;
+  for (; lead - i >= short_lanes; i += short_lanes) {
+    step(d16, i);
+  }
+  for (; count - i >= lanes; i += lanes) step(d, i);
+  for (; count - i >= short_lanes; i += short_lanes) step(d16, i);
+  plain(i, count - i);
 }
 
 // At 100 percent every pixel moves the whole way, to 255 or to 0.
@@ -70,11 +88,13 @@ void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out
     return;
   }
   const uint16_t factor = percent_factor(percent);
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    const auto pixels = hn::LoadU(d, in + i);
-    hn::StoreU(hn::Add(pixels, change<true>(d, pixels, factor)), d, out + i);
-  });
-  plain::brighten_row(in + done, count - done, percent, out + done);
+  for_each_vector(
+      out, count,
+      [&](auto d, size_t i) {
+        const auto pixels = hn::LoadU(d, in + i);
+        hn::StoreU(hn::Add(pixels, change<true>(d, pixels, factor)), d, out + i);
+      },
+      [&](size_t first, size_t n) { plain::brighten_row(in + first, n, percent, out + first); });
 }
 
 void DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
@@ -83,51 +103,61 @@ void DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) 
     return;
   }
   const uint16_t factor = percent_factor(percent);
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    const auto pixels = hn::LoadU(d, in + i);
-    hn::StoreU(hn::Sub(pixels, change<false>(d, pixels, factor)), d, out + i);
-  });
-  plain::darken_row(in + done, count - done, percent, out + done);
+  for_each_vector(
+      out, count,
+      [&](auto d, size_t i) {
+        const auto pixels = hn::LoadU(d, in + i);
+        hn::StoreU(hn::Sub(pixels, change<false>(d, pixels, factor)), d, out + i);
+      },
+      [&](size_t first, size_t n) { plain::darken_row(in + first, n, percent, out + first); });
 }
 
 // Short rows copy faster this way than through memmove, which the plain loop uses.
 void CopyRow(const uint8_t *in, size_t count, uint8_t *out) {
-  const size_t done = for_each_vector(
-      count, [&](auto d, size_t i) { hn::StoreU(hn::LoadU(d, in + i), d, out + i); });
-  plain::copy_row(in + done, count - done, out + done);
+  for_each_vector(
+      out, count, [&](auto d, size_t i) { hn::StoreU(hn::LoadU(d, in + i), d, out + i); },
+      [&](size_t first, size_t n) { plain::copy_row(in + first, n, out + first); });
 }
 
 void BlendRow(const uint8_t *in, size_t count, uint8_t *out) {
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    hn::StoreU(floor_average(d, hn::LoadU(d, out + i), hn::LoadU(d, in + i)), d, out + i);
-  });
-  plain::blend_row(in + done, count - done, out + done);
+  for_each_vector(
+      out, count,
+      [&](auto d, size_t i) {
+        hn::StoreU(floor_average(d, hn::LoadU(d, out + i), hn::LoadU(d, in + i)), d, out + i);
+      },
+      [&](size_t first, size_t n) { plain::blend_row(in + first, n, out + first); });
 }
 
 // The transparent pixels are left out of the store, so their destination bytes are not written.
 void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    const auto source = hn::LoadU(d, in + i);
-    hn::BlendedStore(source, hn::Ne(source, hn::Set(d, key)), d, out + i);
-  });
-  plain::paste_row_with_key(in + done, count - done, key, out + done);
+  for_each_vector(
+      out, count,
+      [&](auto d, size_t i) {
+        const auto source = hn::LoadU(d, in + i);
+        hn::BlendedStore(source, hn::Ne(source, hn::Set(d, key)), d, out + i);
+      },
+      [&](size_t first, size_t n) { plain::paste_row_with_key(in + first, n, key, out + first); });
 }
 
 void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    const auto source = hn::LoadU(d, in + i);
-    const auto blended = floor_average(d, hn::LoadU(d, out + i), source);
-    hn::BlendedStore(blended, hn::Ne(source, hn::Set(d, key)), d, out + i);
-  });
-  plain::blend_row_with_key(in + done, count - done, key, out + done);
+  for_each_vector(
+      out, count,
+      [&](auto d, size_t i) {
+        const auto source = hn::LoadU(d, in + i);
+        const auto blended = floor_average(d, hn::LoadU(d, out + i), source);
+        hn::BlendedStore(blended, hn::Ne(source, hn::Set(d, key)), d, out + i);
+      },
+      [&](size_t first, size_t n) { plain::blend_row_with_key(in + first, n, key, out + first); });
 }
 
 void MaskRow(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    const auto kept = hn::Ne(hn::LoadU(d, in + i), hn::Set(d, key));
-    hn::StoreU(hn::IfThenElseZero(kept, hn::Set(d, uint8_t{1})), d, out + i);
-  });
-  plain::mask_row(in + done, count - done, key, out + done);
+  for_each_vector(
+      out, count,
+      [&](auto d, size_t i) {
+        const auto kept = hn::Ne(hn::LoadU(d, in + i), hn::Set(d, key));
+        hn::StoreU(hn::IfThenElseZero(kept, hn::Set(d, uint8_t{1})), d, out + i);
+      },
+      [&](size_t first, size_t n) { plain::mask_row(in + first, n, key, out + first); });
 }
 
 // Whole vectors from the end while they hold no zero; the plain loop finds the byte in the
