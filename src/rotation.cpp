@@ -183,20 +183,10 @@ struct SignedNearest {
 #endif
 };
 
-// Fills a canvas row outside its resampled run [first, last), first <= last; the run itself is
-// written by the resampling. Filling only what the resampling leaves saves a second write of
-// most of the canvas.
-template <typename Pixel>
-void fill_outside(Pixel *row, int64_t first, int64_t last, int64_t width, Pixel fill) {
-  const auto byte = static_cast<unsigned char>(fill);
-  std::memset(row, byte, static_cast<size_t>(first));
-  std::memset(row + last, byte, static_cast<size_t>(width - last));
-}
-
 // Maps every canvas pixel back through the opposite turn and resamples the source there. The
 // position is linear along a row, so each row first finds the run of columns whose position is
-// inside the source and then steps through it by (cos, sin); pixels outside are filled and not
-// visited. Stepping is exact integer algebra, so the positions equal those computed afresh.
+// inside the source and then steps through it by (cos, sin); pixels outside keep the fill and are
+// not visited. Stepping is exact integer algebra, so the positions equal those computed afresh.
 template <typename Policy>
 void resample_canvas(const Source<typename Policy::Pixel> &src, const CanvasGeometry &g, Turn b,
                      typename Policy::Pixel *canvas) {
@@ -216,14 +206,10 @@ void resample_canvas(const Source<typename Policy::Pixel> &src, const CanvasGeom
     const int64_t sy0 = -b.sin * g.offset_x + b.cos * dy;
     const Span in_x = columns_inside(b.cos, sx0, 0, x_high, g.width);
     const Span in_y = columns_inside(b.sin, sy0, 0, y_high, g.width);
-    // An empty run is taken as [first, first), inside the row, for the fill.
-    int64_t first = in_x.first > in_y.first ? in_x.first : in_y.first;
-    if (first > g.width) first = g.width;
-    int64_t last = in_x.last < in_y.last ? in_x.last : in_y.last;
-    if (last < first) last = first;
-    typename Policy::Pixel *out = canvas + static_cast<size_t>(r) * static_cast<size_t>(g.width);
-    fill_outside(out, first, last, g.width, Policy::kFill);
+    const int64_t first = in_x.first > in_y.first ? in_x.first : in_y.first;
+    const int64_t last = in_x.last < in_y.last ? in_x.last : in_y.last;
     if (first >= last) continue;
+    typename Policy::Pixel *out = canvas + static_cast<size_t>(r) * static_cast<size_t>(g.width);
     int64_t k = first;
     int64_t sx = sx0 + b.cos * first;
     int64_t sy = sy0 + b.sin * first;
@@ -272,6 +258,8 @@ void rotate(const typename Policy::Pixel *pixels, int64_t height, int64_t width,
   *offset_y = static_cast<int32_t>(g.offset_y);
   *offset_x = static_cast<int32_t>(g.offset_x);
   if (block == nullptr) return;
+  const Pixel fill = Policy::kFill;
+  std::memset(block, static_cast<unsigned char>(fill), bytes);
   const Turn opposite = turn_by(static_cast<uint8_t>(-angle & 255));
   resample_canvas<Policy>(Source<Pixel>{pixels, height, width}, g, opposite, block);
 }
