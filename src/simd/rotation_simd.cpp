@@ -115,34 +115,31 @@ class NeighbourReader {
 #endif
 };
 
-// The bilinear total ay * top + fy * bottom reaches 255 * 2^28, beyond a 32-bit lane; its
-// quotient by 2^28 is found without it. Split top = 2^14 * th + tl and bottom = 2^14 * bh + bl
-// (th, bh the arithmetic shifts, tl, bl in [0, 2^14)): then total = 2^14 * A + B with
-// A = ay * th + fy * bh (|A| <= 2^22) and B = ay * tl + fy * bl (0 <= B < 2^28, as ay + fy =
-// 2^14). For integers n and m >= 1, floor((n + f) / m) = floor(n / m) when 0 <= f < 1, so
-// floor(total / 2^28) = (A + (B >> 14)) >> 14, and adding 2^28 - 1 to B first gives the
-// ceiling. The pixel truncates toward zero: the floor for a total of 0 or more (a floor of 0 or
-// more), the ceiling below.
+// The bilinear total ay * top + fy * bottom, with ay = 2^14 - fy, is 2^14 * top + fy * diff for
+// diff = bottom - top; it reaches 255 * 2^28, beyond a 32-bit lane, and its quotient by 2^28 is
+// found without it. Split diff = 2^14 * high + low (high the arithmetic shift, |high| <= 2^8,
+// low in [0, 2^14)): fy * diff = 2^14 * fy * high + fy * low, each product exact in 32 bits, and
+// fy * low = 2^14 * s + r with s = (fy * low) >> 14 and r in [0, 2^14). So total = 2^14 * n + r
+// with n = top + fy * high + s, and, as floor((n + f) / m) = floor(n / m) for integers n and
+// m >= 1 when 0 <= f < 1, floor(total / 2^28) = n >> 14. Adding 2^28 - 1 to the total, which
+// adds 2^14 - 1 to both n and fy * low, gives the ceiling the same way. The pixel truncates
+// toward zero: the floor for a total of 0 or more (a floor of 0 or more), the ceiling below.
 template <bool kSigned>
 V32 bilinear_pixels(D32 d, const NeighbourPairs &pixels, V32 fx, V32 fy) {
   const V32 across = weight_pair(d, fx);
   const V32 top = pair_dot(d, pixels.top, across);
-  const V32 bottom = pair_dot(d, pixels.bottom, across);
-  const V32 fraction = hn::Set(d, kFractionMask);
-  const V32 whole_parts = hn::Or(hn::And(hn::ShiftRight<14>(top), hn::Set(d, 0xFFFF)),
-                                 hn::ShiftLeft<16>(hn::ShiftRight<14>(bottom)));
-  const V32 fraction_parts =
-      hn::Or(hn::And(top, fraction), hn::ShiftLeft<16>(hn::And(bottom, fraction)));
-  const V32 down = weight_pair(d, fy);
-  const V32 a = pair_dot(d, whole_parts, down);
-  const V32 b = pair_dot(d, fraction_parts, down);
-  const V32 floor = hn::ShiftRight<14>(hn::Add(a, hn::ShiftRight<14>(b)));
+  const V32 diff = hn::Sub(pair_dot(d, pixels.bottom, across), top);
+  // fy has no high half, so each pair_dot is the one product of the low halves.
+  const V32 top_and_high = hn::Add(top, pair_dot(d, hn::ShiftRight<14>(diff), fy));
+  const V32 low_product = pair_dot(d, hn::And(diff, hn::Set(d, kFractionMask)), fy);
+  const V32 floor = hn::ShiftRight<14>(hn::Add(top_and_high, hn::ShiftRight<14>(low_product)));
   if (!kSigned) return floor;  // the total is never negative
   // The signed pixels were read as s + 128; the weights add up to 2^28, so the total is 128 * 2^28
   // more than the signed one, and each quotient 128 more.
   const V32 bias = hn::Set(d, 128);
-  const V32 b_up = hn::Add(b, hn::Set(d, (int32_t{1} << 28) - 1));
-  const V32 ceiling = hn::ShiftRight<14>(hn::Add(a, hn::ShiftRight<14>(b_up)));
+  const V32 almost_one = hn::Set(d, kFractionMask);
+  const V32 low_up = hn::ShiftRight<14>(hn::Add(low_product, almost_one));
+  const V32 ceiling = hn::ShiftRight<14>(hn::Add(hn::Add(top_and_high, low_up), almost_one));
   return hn::Sub(hn::IfThenElse(hn::Lt(floor, bias), ceiling, floor), bias);
 }
 
