@@ -113,8 +113,9 @@ hn::Vec<hn::Repartition<uint32_t, D16>> pair_squares(D16, hn::Vec<D16> pixels) {
 // 32-bit lane without saturating. A pixel p read unsigned and, its top bit flipped, signed as
 // q = p - 128 gives p * q = p^2 - 128 p: the squares are the dot products plus 128 times the
 // plain sum. Four accumulators keep four dot products in flight. Advances i past the blocks.
-__attribute__((target("avx512vnni"))) void sum_blocks(const uint8_t *pixels, size_t count,
-                                                      size_t &i, PixelSums &result) {
+__attribute__((target(HWY_TARGET_STR ",avx512vnni"))) void sum_blocks(const uint8_t *pixels,
+                                                                      size_t count, size_t &i,
+                                                                      PixelSums &result) {
   const __m512i top_bit = _mm512_set1_epi8(static_cast<char>(0x80));
   const __m512i zero = _mm512_setzero_si512();
   __m512i sums[2] = {zero, zero};
