@@ -218,17 +218,6 @@ void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out)
       [&](size_t first, size_t n) { plain::blend_row_with_key(in + first, n, key, out + first); });
 }
 
-void MaskRow(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  for_each_vector(
-      out, count,
-      [&](auto d, size_t i, const auto &load) {
-        const auto kept = hn::Ne(load(d, in + i), hn::Set(d, key));
-        return hn::IfThenElseZero(kept, hn::Set(d, uint8_t{1}));
-      },
-      EveryLane(),
-      [&](size_t first, size_t n) { plain::mask_row(in + first, n, key, out + first); });
-}
-
 // Whole vectors from the end while they hold no zero; the plain loop finds the byte in the
 // vector that does.
 size_t EndOfLastZero(const uint8_t *bytes, size_t count) {
@@ -261,9 +250,6 @@ void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out)
 void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   plain::blend_row_with_key(in, count, key, out);
 }
-void MaskRow(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  plain::mask_row(in, count, key, out);
-}
 size_t EndOfLastZero(const uint8_t *bytes, size_t count) {
   return plain::end_of_last_zero(bytes, count);
 }
@@ -284,7 +270,6 @@ HWY_EXPORT(CopyRow);
 HWY_EXPORT(BlendRow);
 HWY_EXPORT(PasteRowWithKey);
 HWY_EXPORT(BlendRowWithKey);
-HWY_EXPORT(MaskRow);
 HWY_EXPORT(EndOfLastZero);
 
 void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
@@ -304,10 +289,6 @@ void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *o
 }
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   HWY_DYNAMIC_DISPATCH(BlendRowWithKey)(in, count, key, out);
-}
-
-void mask_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  HWY_DYNAMIC_DISPATCH(MaskRow)(in, count, key, out);
 }
 
 size_t end_of_last_zero(const uint8_t *bytes, size_t count) {

@@ -35,8 +35,6 @@ void blend_row(const uint8_t *in, size_t count, uint8_t *out);
 // Where in[i] differs from key: out[i] = in[i] (paste) or (out[i] + in[i]) >> 1 (blend).
 void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
-// out[i] = 0 where in[i] is key, else 1.
-void mask_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 
 // One past the last zero byte of bytes[0 .. count), or 0 when there is none.
 size_t end_of_last_zero(const uint8_t *bytes, size_t count);
@@ -56,7 +54,6 @@ void copy_row(const uint8_t *in, size_t count, uint8_t *out);
 void blend_row(const uint8_t *in, size_t count, uint8_t *out);
 void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
-void mask_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 size_t end_of_last_zero(const uint8_t *bytes, size_t count);
 // The variants chosen for this machine.
 CompositeRowLoops composite_row_loops();
@@ -69,7 +66,6 @@ using plain::composite_row_loops;
 using plain::copy_row;
 using plain::darken_row;
 using plain::end_of_last_zero;
-using plain::mask_row;
 using plain::paste_row_with_key;
 #endif
 
