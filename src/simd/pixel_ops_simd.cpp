@@ -8,7 +8,9 @@
 #include <hwy/foreach_target.h>  // must come before highway.h
 #include <hwy/highway.h>
 
+#include <cstdint>
 #include <cstring>
+#include <type_traits>
 
 HWY_BEFORE_NAMESPACE();
 namespace kel {
@@ -51,16 +53,102 @@ hn::Vec<D> floor_average(D d, hn::Vec<D> a, hn::Vec<D> b) {
   return hn::Sub(hn::AverageRound(a, b), hn::And(hn::Xor(a, b), hn::Set(d, 1)));
 }
 
-// Runs step(d, i) on whole vectors of the row, full ones and then 16-byte ones for the rest,
-// and returns how many pixels they covered; the plain loop finishes the last few.
-template <class Step>
-size_t for_each_vector(size_t count, Step step) {
-  size_t i = 0;
+// The bytes from `at` to the next multiple of `size` (a power of two) at most `count`.
+size_t bytes_to_boundary(const uint8_t *at, size_t size, size_t count) {
+  const size_t gap = (size - reinterpret_cast<uintptr_t>(at) % size) % size;
+  return gap < count ? gap : count;
+}
+
+// The `keep` of a row operation that writes every pixel.
+struct EveryLane {};
+
+// Writes the vector v to out[i ..] where keep(d, i, load) holds, and only in the first `head`
+// lanes when head is given.
+template <class D, class V, class Keep, class Load>
+void store_vector(D d, size_t i, uint8_t *out, V v, const Keep &keep, const Load &load,
+                  size_t head = 0) {
+  constexpr bool kEvery = std::is_same<Keep, EveryLane>::value;
+  if (head != 0) {
+    const auto first = hn::FirstN(d, head);
+    if constexpr (kEvery) {
+      hn::BlendedStore(v, first, d, out + i);
+    } else {
+      hn::BlendedStore(v, hn::And(first, keep(d, i, load)), d, out + i);
+    }
+  } else if constexpr (kEvery) {
+    hn::StoreU(v, d, out + i);
+  } else {
+    hn::BlendedStore(v, keep(d, i, load), d, out + i);
+  }
+}
+
+// Loads a whole vector.
+struct LoadWhole {
+  template <class D>
+  hn::Vec<D> operator()(D d, const uint8_t *at) const {
+    return hn::LoadU(d, at);
+  }
+};
+
+// Runs a row operation: value(d, i, load) is what the vector of pixels from i becomes,
+// keep(d, i, load) which of its lanes are written (EveryLane for all), both reading vectors with
+// load(d, address); plain(i, n) is the plain loop on pixels i .. i + n - 1. Full vectors start
+// where the output is on a full vector's boundary, so that no store splits a cache line (the
+// input rows commonly share the output's alignment, and then no load does either).
+//
+// AVX-512 masks its byte loads and stores natively: the lanes before the boundary are one masked
+// store of a vector that lies inside the row, and those after the last full vector, or of a row
+// shorter than one, are one masked load and store. The other targets lead long rows up to the
+// boundary with the plain loop and 16-byte vectors, and finish with 16-byte vectors and the
+// plain loop.
+template <class Value, class Keep, class Plain>
+void for_each_vector(uint8_t *out, size_t count, const Value &value, const Keep &keep,
+                     const Plain &plain) {
   const D8 d;
-  for (; count - i >= hn::Lanes(d); i += hn::Lanes(d)) step(d, i);
+  const size_t lanes = hn::Lanes(d);
+  const LoadWhole whole;
+  size_t i = 0;
+#if HWY_TARGET == HWY_AVX3
+  (void)plain;
+  if (count >= lanes && bytes_to_boundary(out, lanes, count) != 0) {
+    i = bytes_to_boundary(out, lanes, count);
+    // The next vector is read before the masked store: a load that overlaps the vector of a
+    // masked store would wait for the store to finish.
+    const auto lead = value(d, 0, whole);
+    if (count - i >= lanes) {
+      const auto next = value(d, i, whole);
+      store_vector(d, 0, out, lead, keep, whole, i);
+      store_vector(d, i, out, next, keep, whole);
+      i += lanes;
+    } else {
+      store_vector(d, 0, out, lead, keep, whole, i);
+    }
+  }
+  for (; count - i >= lanes; i += lanes) store_vector(d, i, out, value(d, i, whole), keep, whole);
+  if (i != count) {
+    const auto rest = hn::FirstN(d, count - i);
+    const auto part = [&rest](D8 dd, const uint8_t *at) { return hn::MaskedLoad(rest, dd, at); };
+    store_vector(d, i, out, value(d, i, part), keep, part, count - i);
+  }
+#else
   const hn::CappedTag<uint8_t, 16> d16;
-  for (; count - i >= hn::Lanes(d16); i += hn::Lanes(d16)) step(d16, i);
-  return i;
+  const size_t short_lanes = hn::Lanes(d16);
+  // A short row, such as one of a pasted sprite, would spend more on the lead-in than it saves.
+  constexpr size_t kAlignFrom = 4096;
+  if (count >= kAlignFrom) {
+    i = bytes_to_boundary(out, short_lanes, count);
+    plain(size_t{0}, i);
+    const size_t lead = i + bytes_to_boundary(out + i, lanes, count - i);
+    for (; lead - i >= short_lanes; i += short_lanes) {
+      store_vector(d16, i, out, value(d16, i, whole), keep, whole);
+    }
+  }
+  for (; count - i >= lanes; i += lanes) store_vector(d, i, out, value(d, i, whole), keep, whole);
+  for (; count - i >= short_lanes; i += short_lanes) {
+    store_vector(d16, i, out, value(d16, i, whole), keep, whole);
+  }
+  if (i != count) plain(i, count - i);
+#endif
 }
 
 // At 100 percent every pixel moves the whole way, to 255 or to 0.
@@ -70,11 +158,14 @@ void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out
     return;
   }
   const uint16_t factor = percent_factor(percent);
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    const auto pixels = hn::LoadU(d, in + i);
-    hn::StoreU(hn::Add(pixels, change<true>(d, pixels, factor)), d, out + i);
-  });
-  plain::brighten_row(in + done, count - done, percent, out + done);
+  for_each_vector(
+      out, count,
+      [&](auto d, size_t i, const auto &load) {
+        const auto pixels = load(d, in + i);
+        return hn::Add(pixels, change<true>(d, pixels, factor));
+      },
+      EveryLane(),
+      [&](size_t first, size_t n) { plain::brighten_row(in + first, n, percent, out + first); });
 }
 
 void DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
@@ -83,43 +174,48 @@ void DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) 
     return;
   }
   const uint16_t factor = percent_factor(percent);
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    const auto pixels = hn::LoadU(d, in + i);
-    hn::StoreU(hn::Sub(pixels, change<false>(d, pixels, factor)), d, out + i);
-  });
-  plain::darken_row(in + done, count - done, percent, out + done);
+  for_each_vector(
+      out, count,
+      [&](auto d, size_t i, const auto &load) {
+        const auto pixels = load(d, in + i);
+        return hn::Sub(pixels, change<false>(d, pixels, factor));
+      },
+      EveryLane(),
+      [&](size_t first, size_t n) { plain::darken_row(in + first, n, percent, out + first); });
 }
 
 // Short rows copy faster this way than through memmove, which the plain loop uses.
 void CopyRow(const uint8_t *in, size_t count, uint8_t *out) {
-  const size_t done = for_each_vector(
-      count, [&](auto d, size_t i) { hn::StoreU(hn::LoadU(d, in + i), d, out + i); });
-  plain::copy_row(in + done, count - done, out + done);
+  for_each_vector(
+      out, count, [&](auto d, size_t i, const auto &load) { return load(d, in + i); }, EveryLane(),
+      [&](size_t first, size_t n) { plain::copy_row(in + first, n, out + first); });
 }
 
 void BlendRow(const uint8_t *in, size_t count, uint8_t *out) {
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    hn::StoreU(floor_average(d, hn::LoadU(d, out + i), hn::LoadU(d, in + i)), d, out + i);
-  });
-  plain::blend_row(in + done, count - done, out + done);
+  for_each_vector(
+      out, count,
+      [&](auto d, size_t i, const auto &load) {
+        return floor_average(d, load(d, out + i), load(d, in + i));
+      },
+      EveryLane(), [&](size_t first, size_t n) { plain::blend_row(in + first, n, out + first); });
 }
 
 // The transparent pixels are left out of the store, so their destination bytes are not written.
 void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    const auto source = hn::LoadU(d, in + i);
-    hn::BlendedStore(source, hn::Ne(source, hn::Set(d, key)), d, out + i);
-  });
-  plain::paste_row_with_key(in + done, count - done, key, out + done);
+  for_each_vector(
+      out, count, [&](auto d, size_t i, const auto &load) { return load(d, in + i); },
+      [&](auto d, size_t i, const auto &load) { return hn::Ne(load(d, in + i), hn::Set(d, key)); },
+      [&](size_t first, size_t n) { plain::paste_row_with_key(in + first, n, key, out + first); });
 }
 
 void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
-    const auto source = hn::LoadU(d, in + i);
-    const auto blended = floor_average(d, hn::LoadU(d, out + i), source);
-    hn::BlendedStore(blended, hn::Ne(source, hn::Set(d, key)), d, out + i);
-  });
-  plain::blend_row_with_key(in + done, count - done, key, out + done);
+  for_each_vector(
+      out, count,
+      [&](auto d, size_t i, const auto &load) {
+        return floor_average(d, load(d, out + i), load(d, in + i));
+      },
+      [&](auto d, size_t i, const auto &load) { return hn::Ne(load(d, in + i), hn::Set(d, key)); },
+      [&](size_t first, size_t n) { plain::blend_row_with_key(in + first, n, key, out + first); });
 }
 
 // Whole vectors from the end while they hold no zero; the plain loop finds the byte in the

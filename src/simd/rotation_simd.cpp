@@ -35,8 +35,8 @@ Positions first_positions(D32 d, const RotationRow &row) {
 }
 
 // The byte offset of each lane's whole-pixel position (x0, y0).
-V32 pixel_offsets(D32 d, const Positions &p, int32_t width) {
-  return hn::Add(hn::Mul(hn::ShiftRight<14>(p.y), hn::Set(d, width)), hn::ShiftRight<14>(p.x));
+V32 pixel_offsets(const Positions &p, V32 width) {
+  return hn::Add(hn::Mul(hn::ShiftRight<14>(p.y), width), hn::ShiftRight<14>(p.x));
 }
 
 // For each lane, low(pairs) * low(weights) + high(pairs) * high(weights), the halves read as
@@ -63,75 +63,96 @@ V32 weight_pair(D32 d, V32 fraction) {
   return hn::Or(hn::Sub(hn::Set(d, 16384), fraction), hn::ShiftLeft<16>(fraction));
 }
 
-// The four neighbours of each lane as the bytes of one word, (P00, P10) from a 4-byte read at
-// the position's offset and (P01, P11) from one at offset + width - 2. Both reads stay inside
-// the source: a bilinear position has x0 + 1 < W and y0 + 1 < H, so the first read ends at
-// byte (H - 1) * W + 1 at most and the second starts at byte W - 2 or later.
-V32 neighbour_words(D32 d, const uint8_t *src, V32 offset, int32_t width) {
-  const auto *words = reinterpret_cast<const int32_t *>(src);
-  const V32 upper = hn::GatherOffset(d, words, offset);
-  const V32 lower = hn::GatherOffset(d, words, hn::Add(offset, hn::Set(d, width - 2)));
-  const V32 low_half = hn::Set(d, 0xFFFF);
-  return hn::Or(hn::And(upper, low_half), hn::AndNot(low_half, lower));
-}
-
 // The pairs (P00, P10) and (P01, P11) of each lane as its 16-bit halves, the low half the left
 // neighbour: the operands of pair_dot.
 struct NeighbourPairs {
   V32 top, bottom;
 };
 
-template <bool kSigned>
-NeighbourPairs neighbour_pairs(D32 d, V32 words) {
-  if (kSigned) {
-    // Sign-extend each byte from the top of the lane, then keep the left one's low 16 bits.
-    const V32 low_half = hn::Set(d, 0xFFFF);
-    const V32 p00 = hn::ShiftRight<24>(hn::ShiftLeft<24>(words));
-    const V32 p10 = hn::ShiftRight<24>(hn::ShiftLeft<16>(words));
-    const V32 p01 = hn::ShiftRight<24>(hn::ShiftLeft<8>(words));
-    const V32 p11 = hn::ShiftRight<24>(words);
-    return {hn::Or(hn::And(p00, low_half), hn::ShiftLeft<16>(p10)),
-            hn::Or(hn::And(p01, low_half), hn::ShiftLeft<16>(p11))};
+// Where each lane's pairs come from: (P00, P10) are the first two bytes of a 4-byte read at the
+// position's offset, (P01, P11) the last two of one at offset + width - 2. Both reads stay inside
+// the source: a bilinear position has x0 + 1 < W and y0 + 1 < H, so the first read ends at byte
+// (H - 1) * W + 1 at most and the second starts at byte W - 2 or later. A byte shuffle spreads
+// each pair into the halves of its lane; the one-lane fallback target takes the bytes apart.
+class NeighbourReader {
+ public:
+  NeighbourReader(D32 d, const uint8_t *src, int32_t width)
+      : words_(reinterpret_cast<const int32_t *>(src)), below_(hn::Set(d, width - 2)) {
+#if HWY_TARGET != HWY_SCALAR
+    // Shuffle indices count bytes from the start of each 16-byte block, four lanes to a block;
+    // an index of 0x80 gives a zero byte.
+    const V32 lane_start = hn::ShiftLeft<2>(hn::And(hn::Iota(d, 0), hn::Set(d, 3)));
+    const V32 in_lane = hn::Or(lane_start, hn::ShiftLeft<16>(lane_start));
+    first_two_ = hn::Or(in_lane, hn::Set(d, static_cast<int32_t>(0x80018000u)));
+    last_two_ = hn::Or(in_lane, hn::Set(d, static_cast<int32_t>(0x80038002u)));
+#endif
   }
-  const V32 byte = hn::Set(d, 0xFF);
-  const V32 third_byte = hn::Set(d, 0xFF0000);
-  return {hn::Or(hn::And(words, byte), hn::And(hn::ShiftLeft<8>(words), third_byte)),
-          hn::Or(hn::And(hn::ShiftRight<16>(words), byte),
-                 hn::And(hn::ShiftRight<8>(words), third_byte))};
-}
 
-// The bilinear total ay * top + fy * bottom reaches 255 * 2^28, beyond a 32-bit lane; its
-// quotient by 2^28 is found without it. Split top = 2^14 * th + tl and bottom = 2^14 * bh + bl
-// (th, bh the arithmetic shifts, tl, bl in [0, 2^14)): then total = 2^14 * A + B with
-// A = ay * th + fy * bh (|A| <= 2^22) and B = ay * tl + fy * bl (0 <= B < 2^28, as ay + fy =
-// 2^14). For integers n and m >= 1, floor((n + f) / m) = floor(n / m) when 0 <= f < 1, so
-// floor(total / 2^28) = (A + (B >> 14)) >> 14, and adding 2^28 - 1 to B first gives the
-// ceiling. The pixel truncates toward zero: the floor for a total of 0 or more (a floor of 0 or
-// more), the ceiling below.
+  NeighbourPairs pairs(D32 d, V32 offset) const {
+    const V32 upper = hn::GatherOffset(d, words_, offset);
+    const V32 lower = hn::GatherOffset(d, words_, hn::Add(offset, below_));
+#if HWY_TARGET == HWY_SCALAR
+    const V32 byte = hn::Set(d, 0xFF);
+    const V32 third_byte = hn::Set(d, 0xFF0000);
+    return {hn::Or(hn::And(upper, byte), hn::And(hn::ShiftLeft<8>(upper), third_byte)),
+            hn::Or(hn::And(hn::ShiftRight<16>(lower), byte),
+                   hn::And(hn::ShiftRight<8>(lower), third_byte))};
+#else
+    const hn::Repartition<uint8_t, D32> d8;
+    const auto spread = [&](V32 word, V32 indices) {
+      return hn::BitCast(d,
+                         hn::TableLookupBytesOr0(hn::BitCast(d8, word), hn::BitCast(d8, indices)));
+    };
+    return {spread(upper, first_two_), spread(lower, last_two_)};
+#endif
+  }
+
+ private:
+  const int32_t *words_;
+  V32 below_;
+#if HWY_TARGET != HWY_SCALAR
+  V32 first_two_, last_two_;
+#endif
+};
+
+// The bilinear total ay * top + fy * bottom, with ay = 2^14 - fy, is 2^14 * top + fy * diff for
+// diff = bottom - top; it reaches 255 * 2^28, beyond a 32-bit lane, and its quotient by 2^28 is
+// found without it. Split diff = 2^14 * high + low (high the arithmetic shift, |high| <= 2^8,
+// low in [0, 2^14)): fy * diff = 2^14 * fy * high + fy * low, each product exact in 32 bits, and
+// fy * low = 2^14 * s + r with s = (fy * low) >> 14 and r in [0, 2^14). So total = 2^14 * n + r
+// with n = top + fy * high + s, and, as floor((n + f) / m) = floor(n / m) for integers n and
+// m >= 1 when 0 <= f < 1, floor(total / 2^28) = n >> 14. Adding 2^28 - 1 to the total, which
+// adds 2^14 - 1 to both n and fy * low, gives the ceiling the same way. The pixel truncates
+// toward zero: the floor for a total of 0 or more (a floor of 0 or more), the ceiling below.
 template <bool kSigned>
 V32 bilinear_pixels(D32 d, const NeighbourPairs &pixels, V32 fx, V32 fy) {
   const V32 across = weight_pair(d, fx);
   const V32 top = pair_dot(d, pixels.top, across);
-  const V32 bottom = pair_dot(d, pixels.bottom, across);
-  const V32 fraction = hn::Set(d, kFractionMask);
-  const V32 whole_parts = hn::Or(hn::And(hn::ShiftRight<14>(top), hn::Set(d, 0xFFFF)),
-                                 hn::ShiftLeft<16>(hn::ShiftRight<14>(bottom)));
-  const V32 fraction_parts =
-      hn::Or(hn::And(top, fraction), hn::ShiftLeft<16>(hn::And(bottom, fraction)));
-  const V32 down = weight_pair(d, fy);
-  const V32 a = pair_dot(d, whole_parts, down);
-  const V32 b = pair_dot(d, fraction_parts, down);
-  const V32 floor = hn::ShiftRight<14>(hn::Add(a, hn::ShiftRight<14>(b)));
+  const V32 diff = hn::Sub(pair_dot(d, pixels.bottom, across), top);
+  // fy has no high half, so each pair_dot is the one product of the low halves.
+  const V32 top_and_high = hn::Add(top, pair_dot(d, hn::ShiftRight<14>(diff), fy));
+  const V32 low_product = pair_dot(d, hn::And(diff, hn::Set(d, kFractionMask)), fy);
+  const V32 floor = hn::ShiftRight<14>(hn::Add(top_and_high, hn::ShiftRight<14>(low_product)));
   if (!kSigned) return floor;  // the total is never negative
-  const V32 b_up = hn::Add(b, hn::Set(d, (int32_t{1} << 28) - 1));
-  const V32 ceiling = hn::ShiftRight<14>(hn::Add(a, hn::ShiftRight<14>(b_up)));
-  return hn::IfThenElse(hn::Lt(floor, hn::Zero(d)), ceiling, floor);
+  // The signed pixels were read as s + 128; the weights add up to 2^28, so the total is 128 * 2^28
+  // more than the signed one, and each quotient 128 more.
+  const V32 bias = hn::Set(d, 128);
+  const V32 almost_one = hn::Set(d, kFractionMask);
+  const V32 low_up = hn::ShiftRight<14>(hn::Add(low_product, almost_one));
+  const V32 ceiling = hn::ShiftRight<14>(hn::Add(hn::Add(top_and_high, low_up), almost_one));
+  return hn::Sub(hn::IfThenElse(hn::Lt(floor, bias), ceiling, floor), bias);
 }
 
 template <typename Pixel>
 void store_pixels(V32 values, Pixel *out) {
+#if HWY_TARGET == HWY_AVX3
+  // Every value fits its pixel, so keeping each lane's low byte is exact: one instruction where
+  // the saturating demotion packs twice and permutes.
+  _mm_storeu_si128(reinterpret_cast<__m128i *>(out), _mm512_cvtepi32_epi8(values.raw));
+#else
   const hn::Rebind<Pixel, D32> d8;
   hn::StoreU(hn::DemoteTo(d8, values), d8, out);
+#endif
 }
 
 template <bool kSigned, typename Pixel>
@@ -143,10 +164,20 @@ size_t bilinear_row(const RotationRow &row, Pixel *out) {
   const V32 advance_x = hn::Set(d, row.step_x * static_cast<int32_t>(lanes));
   const V32 advance_y = hn::Set(d, row.step_y * static_cast<int32_t>(lanes));
   const V32 fraction = hn::Set(d, kFractionMask);
+  const NeighbourReader reader(d, src, row.width);
+  // Locals, as the stores to the canvas could alias the row's fields.
+  const V32 width = hn::Set(d, row.width);
+  const size_t count = row.count;
+  // A signed pixel s is read as the unsigned s + 128 (its top bit flipped), which needs no sign
+  // extension; bilinear_pixels takes the 128 back off.
+  const V32 pair_top_bits = hn::Set(d, 0x00800080);
   size_t done = 0;
-  for (; done + lanes <= row.count; done += lanes) {
-    const V32 words = neighbour_words(d, src, pixel_offsets(d, p, row.width), row.width);
-    const NeighbourPairs pixels = neighbour_pairs<kSigned>(d, words);
+  for (; done + lanes <= count; done += lanes) {
+    NeighbourPairs pixels = reader.pairs(d, pixel_offsets(p, width));
+    if (kSigned) {
+      pixels.top = hn::Xor(pixels.top, pair_top_bits);
+      pixels.bottom = hn::Xor(pixels.bottom, pair_top_bits);
+    }
     const V32 values =
         bilinear_pixels<kSigned>(d, pixels, hn::And(p.x, fraction), hn::And(p.y, fraction));
     store_pixels(values, out + done);
@@ -175,9 +206,11 @@ size_t NearestRowI8(const RotationRow &row, int8_t *out) {
   const V32 advance_x = hn::Set(d, row.step_x * static_cast<int32_t>(lanes));
   const V32 advance_y = hn::Set(d, row.step_y * static_cast<int32_t>(lanes));
   const V32 last_read = hn::Set(d, row.width * row.height - 4);
+  const V32 width = hn::Set(d, row.width);
+  const size_t count = row.count;
   size_t done = 0;
-  for (; done + lanes <= row.count; done += lanes) {
-    const V32 offset = pixel_offsets(d, p, row.width);
+  for (; done + lanes <= count; done += lanes) {
+    const V32 offset = pixel_offsets(p, width);
     const V32 read_at = hn::Min(offset, last_read);
     const V32 word = hn::GatherOffset(d, words, read_at);
     // The pixel is byte (offset - read_at) of the word; move it to the top and sign-extend.
