@@ -251,7 +251,10 @@ void rotate(const typename Policy::Pixel *pixels, int64_t height, int64_t width,
     return;
   }
   const size_t bytes = static_cast<size_t>(g.height) * static_cast<size_t>(g.width);
-  Pixel *block = static_cast<Pixel *>(std::malloc(bytes));
+  // Taken back through a volatile so that no compiler merges this malloc and the fill of 0 below
+  // into calloc: the header promises malloc, and hosts that count on it may provide no calloc.
+  Pixel *volatile fresh = static_cast<Pixel *>(std::malloc(bytes));
+  Pixel *block = fresh;
   *canvas = block;
   *canvas_height = static_cast<int32_t>(g.height);
   *canvas_width = static_cast<int32_t>(g.width);
