@@ -4,6 +4,7 @@
 // Highway picks vector variants at run time the table runs once per variant this CPU has.
 //   truth                 run the table; prints each failing row and "N passed, M failed"
 //   truth --write FILE    recompute every digest (pictures stay as written) into FILE
+//   truth --threads N     run the table on N threads at once (host builds)
 #include <stdint.h>
 #include <stdio.h>
 #include <stdlib.h>
@@ -13,6 +14,12 @@
 #include "kel_outside.h"
 #if KEL_USE_HIGHWAY && !defined(HWY_COMPILE_ONLY_STATIC)
 #include <hwy/targets.h>
+#endif
+#if KEL_TRUTH_THREADS
+#include <thread>
+#endif
+#ifndef KEL_USE_HIGHWAY
+#define KEL_USE_HIGHWAY 0
 #endif
 
 namespace {
@@ -578,17 +585,34 @@ int write_table(const char *path) {
 
 int main(int argc, char **argv) {
   if (argc == 3 && strcmp(argv[1], "--write") == 0) return write_table(argv[2]);
-  if (argc != 1) return printf("usage: %s [--write FILE]\n", argv[0]), 2;
   int passed = 0, failed = 0;
+  if (argc == 1) {
 #if KEL_USE_HIGHWAY && !defined(HWY_COMPILE_ONLY_STATIC)
-  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
-    hwy::SetSupportedTargetsForTest(target);
-    failed += run_table(hwy::TargetName(target), passed);
-  }
-  hwy::SetSupportedTargetsForTest(0);
+    for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
+      hwy::SetSupportedTargetsForTest(target);
+      failed += run_table(hwy::TargetName(target), passed);
+    }
+    hwy::SetSupportedTargetsForTest(0);
 #else
-  failed = run_table("plain", passed);
+    failed = run_table(KEL_USE_HIGHWAY ? "baseline" : "plain", passed);
 #endif
+  }
+#if KEL_TRUTH_THREADS
+  // Every thread runs the whole table at once: a routine that kept state between calls would
+  // show up here as a wrong row, or as a race under ThreadSanitizer.
+  else if (argc == 3 && strcmp(argv[1], "--threads") == 0) {
+    std::thread threads[16];
+    int counts[16][2] = {};
+    const int n = atoi(argv[2]) < 16 ? atoi(argv[2]) : 16;
+    for (int i = 0; i < n; ++i) {
+      threads[i] = std::thread([&counts, i] { counts[i][1] = run_table("thread", counts[i][0]); });
+    }
+    for (int i = 0; i < n; ++i) threads[i].join(), passed += counts[i][0], failed += counts[i][1];
+  }
+#endif
+  else {
+    return printf("usage: %s [--write FILE | --threads N]\n", argv[0]), 2;
+  }
   printf("%d passed, %d failed\n", passed, failed);
   return failed ? 1 : 0;
 }
