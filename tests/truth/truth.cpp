@@ -10,6 +10,8 @@
 #include <stdlib.h>
 #include <string.h>
 
+#include <initializer_list>
+
 #include "kel_images.h"
 #include "kel_outside.h"
 #if KEL_USE_HIGHWAY && !defined(HWY_COMPILE_ONLY_STATIC)
@@ -174,271 +176,257 @@ void render_drawing(Text &t, const Raster &r, Spec bg, uint8_t colour) {
 }
 
 // ---------------------------------------------------------------------------------------------
-// The routines. Each takes its row's arguments: numbers in a[], input specs in s[], in the order
-// the row gives them (a spec is not counted among the numbers).
-using Args = const int64_t *;
-using Specs = const Spec *;
-template <typename T>
-T as(int64_t v) {
-  return static_cast<T>(v);
-}
+// The routines. Each reads its row's numbers from a[] and its input specs from s[], each in the
+// order the row gives them, and renders what the call produced into t.
+struct Call {
+  Text &t;
+  const int64_t *a;
+  const Spec *s;
+  int n;  // how many numbers the row gave
+  int32_t i(int k) const { return static_cast<int32_t>(a[k]); }
+  uint32_t u(int k) const { return static_cast<uint32_t>(a[k]); }
+  uint16_t u16(int k) const { return static_cast<uint16_t>(a[k]); }
+  uint8_t u8(int k) const { return static_cast<uint8_t>(a[k]); }
+  int64_t distance(const void *p, const void *base) const {  // wrapped to 32 bits
+    return static_cast<int32_t>(
+        static_cast<uint32_t>(reinterpret_cast<uintptr_t>(p) - reinterpret_cast<uintptr_t>(base)));
+  }
+};
 
 // image h w pixel_bytes stride|-1: the record (made by kel_image_create when stride is -1), its
-// last pixel's offset and address, and the area after kel_image_clear.
-void image(Text &t, Args a, Specs) {
-  kel_image *im = a[3] < 0
-                      ? kel_image_create(as<int32_t>(a[0]), as<int32_t>(a[1]), as<int32_t>(a[2]))
-                      : kel_image_create_ex(as<int32_t>(a[0]), as<int32_t>(a[1]), as<int32_t>(a[2]),
-                                            as<int32_t>(a[3]));
-  if (im == nullptr) return t.put("null\n");
-  const int64_t fields[] = {im->height, im->width, im->stride, im->pixel_bytes,
-                            im->data == reinterpret_cast<uint8_t *>(im + 1)};
-  t.nums("record", fields, 5);
+// last pixel's offset and address, and what kel_image_clear leaves.
+void image(Call &c) {
+  kel_image *im = c.a[3] < 0 ? kel_image_create(c.i(0), c.i(1), c.i(2))
+                             : kel_image_create_ex(c.i(0), c.i(1), c.i(2), c.i(3));
+  if (im == nullptr) return c.t.put("null\n");
   const size_t bytes = static_cast<size_t>(im->height) * static_cast<size_t>(im->stride);
   memset(im->data, 0xA5, bytes);
   kel_image_clear(im);
   int64_t left = 0;
-  for (size_t i = 0; i < bytes; ++i) left += im->data[i];
-  const int32_t off = kel_image_offset(im, im->height - 1, im->width - 1);
-  const int64_t last[] = {off, kel_image_ptr(im, im->height - 1, im->width - 1) - im->data, left};
-  t.nums("last clear", last, 3);
+  for (size_t k = 0; k < bytes; ++k) left += im->data[k];
+  const int32_t row = im->height - 1, col = im->width - 1;
+  const int64_t v[] = {im->height,
+                       im->width,
+                       im->stride,
+                       im->pixel_bytes,
+                       c.distance(im->data, im + 1),
+                       kel_image_offset(im, row, col),
+                       c.distance(kel_image_ptr(im, row, col), im->data),
+                       left};
+  c.t.nums("h w stride bytes, data, last offset and address, left after clear", v, 8);
   kel_image_delete(im);
   kel_image_delete(nullptr);
 }
 
 // offset stride pixel_bytes row col: addressing in wrapping 32-bit arithmetic, on a record that
 // owns no pixels (nothing is dereferenced).
-void offset(Text &t, Args a, Specs) {
+void offset(Call &c) {
   uint8_t base[1];
-  const kel_image im = {base, 1, 1, as<int32_t>(a[0]), as<int32_t>(a[1])};
-  const int32_t off = kel_image_offset(&im, as<int32_t>(a[2]), as<int32_t>(a[3]));
-  const uintptr_t p =
-      reinterpret_cast<uintptr_t>(kel_image_ptr(&im, as<int32_t>(a[2]), as<int32_t>(a[3])));
-  const int64_t v[] = {off, as<int32_t>(as<uint32_t>(p - reinterpret_cast<uintptr_t>(base)))};
-  t.nums("offset ptr", v, 2);
+  const kel_image im = {base, 1, 1, c.i(0), c.i(1)};
+  const int64_t v[] = {kel_image_offset(&im, c.i(2), c.i(3)),
+                       c.distance(kel_image_ptr(&im, c.i(2), c.i(3)), base)};
+  c.t.nums("offset ptr", v, 2);
 }
 
 // rows height row_step: the row table's entries as distances from the buffer, and one entry
-// beyond it that must stay untouched.
-void rows(Text &t, Args a, Specs) {
+// beyond it that must stay untouched (-1).
+void rows(Call &c) {
   static uint8_t buf[1];
-  uint8_t *table[66];
-  for (uint8_t *&p : table) p = nullptr;
-  kel_images_1D_to_2D(buf, as<uint32_t>(a[0]), as<int32_t>(a[1]), table);
+  uint8_t *table[66] = {};
   int64_t v[66];
-  for (int i = 0; i < 66; ++i)
-    v[i] = table[i] ? as<int32_t>(as<uint32_t>(reinterpret_cast<uintptr_t>(table[i]) -
-                                               reinterpret_cast<uintptr_t>(buf)))
-                    : -1;
-  t.nums("rows", v, a[0] + 1 < 66 ? static_cast<int>(a[0]) + 1 : 66);
+  kel_images_1D_to_2D(buf, c.u(0), c.i(1), table);
+  for (int k = 0; k < 66; ++k) v[k] = table[k] ? c.distance(table[k], buf) : -1;
+  c.t.nums("rows", v, c.a[0] < 65 ? c.i(0) + 1 : 66);
 }
 
 // pixel <raster> h w y x colour
-void pixel(Text &t, Args a, Specs s) {
-  Raster r(s[0], a[0], a[1]);
-  kel_set_pixel(r.data(), as<uint32_t>(a[0]), as<uint32_t>(a[1]), as<uint32_t>(a[2]),
-                as<uint16_t>(a[3]), as<uint8_t>(a[4]));
-  render(t, r);
+void pixel(Call &c) {
+  Raster r(c.s[0], c.a[0], c.a[1]);
+  kel_set_pixel(r.data(), c.u(0), c.u(1), c.u(2), c.u16(3), c.u8(4));
+  render(c.t, r);
 }
 
 // stats <raster> h w bits: both histograms, the image statistics (the mean stored and not) and
 // the histogram statistics over the image's own pixel count.
-void stats(Text &t, Args a, Specs s) {
-  Raster r(s[0], a[0], a[1]);
-  const int32_t h = as<int32_t>(a[0]), w = as<int32_t>(a[1]);
+void stats(Call &c) {
+  Raster r(c.s[0], c.a[0], c.a[1]);
+  const int32_t h = c.i(0), w = c.i(1);
   uint32_t hist[256], reduced[256];
   int64_t v[256];
   kel_image_histogram(r.data(), h, w, hist);
   for (uint32_t &bin : reduced) bin = 0xDEADBEEF;
-  kel_image_histogram_n(r.data(), h, w, as<uint32_t>(a[2]), reduced);
-  for (int i = 0; i < 256; ++i) v[i] = hist[i];
-  t.nums("hist", v, 256);
-  for (int i = 0; i < 256; ++i) v[i] = reduced[i];
-  t.nums("reduced", v, 256);
+  kel_image_histogram_n(r.data(), h, w, c.u(2), reduced);
+  for (int k = 0; k < 256; ++k) v[k] = hist[k];
+  c.t.nums("hist", v, 256);
+  for (int k = 0; k < 256; ++k) v[k] = reduced[k];
+  c.t.nums("reduced", v, 256);
   uint8_t mean_var = 1, mean_std = 2;
-  const uint16_t var = kel_image_var(r.data(), h, w, &mean_var);
-  const uint8_t std_dev = kel_image_std(r.data(), h, w, &mean_std);
-  const uint32_t count = as<uint32_t>(h) * as<uint32_t>(w);
+  const uint32_t count = c.u(0) * c.u(1);
   const uint8_t mean = kel_hist_mean(hist, count);
-  const int64_t out[] = {var,
+  const int64_t out[] = {kel_image_var(r.data(), h, w, &mean_var),
                          mean_var,
-                         std_dev,
+                         kel_image_std(r.data(), h, w, &mean_std),
                          mean_std,
                          kel_image_var(r.data(), h, w, nullptr),
                          kel_image_std(r.data(), h, w, nullptr),
                          mean,
                          kel_hist_var(hist, mean, count),
                          kel_hist_std(hist, mean, count)};
-  t.nums("var mean std mean var std hmean hvar hstd", out, 9);
-  if (!r.guards_intact()) t.put("guard bytes written\n");
+  c.t.nums("var mean std mean var std hmean hvar hstd", out, 9);
+  if (!r.guards_intact()) c.t.put("guard bytes written\n");
 }
 
 // hstat seed scale count|-1 mean|-1: statistics of a histogram of random bins below scale (any
 // 32-bit value for 0), over count pixels (their sum for -1), about mean (the computed one for -1).
-void hstat(Text &t, Args a, Specs) {
-  uint32_t hist[256], sum = 0, seed = as<uint32_t>(a[0]) * 2654435761u + 7;
-  for (uint32_t &bin : hist) sum += bin = a[1] ? next(seed) % as<uint32_t>(a[1]) : next(seed);
-  const uint32_t count = a[2] < 0 ? sum : as<uint32_t>(a[2]);
-  const uint8_t mean = a[3] < 0 ? kel_hist_mean(hist, count) : as<uint8_t>(a[3]);
+void hstat(Call &c) {
+  uint32_t hist[256], sum = 0, seed = c.u(0) * 2654435761u + 7;
+  for (uint32_t &bin : hist) sum += bin = c.a[1] ? next(seed) % c.u(1) : next(seed);
+  const uint32_t count = c.a[2] < 0 ? sum : c.u(2);
+  const uint8_t mean = c.a[3] < 0 ? kel_hist_mean(hist, count) : c.u8(3);
   const int64_t v[] = {kel_hist_mean(hist, count), kel_hist_var(hist, mean, count),
                        kel_hist_std(hist, mean, count)};
-  t.nums("mean var std", v, 3);
+  c.t.nums("mean var std", v, 3);
 }
 
 // rotate <raster> h w angle: the three rotations of the same bytes (read as signed for the
-// int8 ones), each canvas with its size and the source corner's position.
-void rotate(Text &t, Args a, Specs s) {
-  Raster r(s[0], a[0], a[1]);
+// int8 ones), each canvas with its size, the source corner's position and whether it was made.
+void rotate(Call &c) {
+  Raster r(c.s[0], c.a[0], c.a[1]);
   const auto *signed_src = reinterpret_cast<const int8_t *>(r.data());
-  const uint8_t angle = as<uint8_t>(a[2]);
+  static const char *const kLabels[] = {"u8", "s8", "nn"};
   for (int kind = 0; kind < 3; ++kind) {
     uint8_t *canvas = nullptr;
-    int32_t g[4] = {-9, -9, -9, -9};
     auto **signed_canvas = reinterpret_cast<int8_t **>(&canvas);
+    int32_t g[4] = {-9, -9, -9, -9};
     if (kind == 0)
-      kel_image_rotate(r.data(), as<uint32_t>(a[0]), as<uint32_t>(a[1]), angle, &canvas, &g[0],
-                       &g[1], &g[2], &g[3]);
+      kel_image_rotate(r.data(), c.u(0), c.u(1), c.u8(2), &canvas, g, g + 1, g + 2, g + 3);
     if (kind == 1)
-      kel_image_rotate_int8(signed_src, as<uint32_t>(a[0]), as<uint32_t>(a[1]), angle,
-                            signed_canvas, &g[0], &g[1], &g[2], &g[3]);
+      kel_image_rotate_int8(signed_src, c.u(0), c.u(1), c.u8(2), signed_canvas, g, g + 1, g + 2,
+                            g + 3);
     if (kind == 2)
-      kel_image_rotate_int8_nn(signed_src, as<int32_t>(a[0]), as<int32_t>(a[1]), angle,
-                               signed_canvas, &g[0], &g[1], &g[2], &g[3]);
+      kel_image_rotate_int8_nn(signed_src, c.i(0), c.i(1), c.u8(2), signed_canvas, g, g + 1, g + 2,
+                               g + 3);
     const int64_t geometry[] = {g[0], g[1], g[2], g[3], canvas != nullptr};
-    t.nums(kind == 0   ? "u8 canvas h w offset y x"
-           : kind == 1 ? "s8 canvas h w offset y x"
-                       : "nn canvas h w offset y x",
-           geometry, 5);
-    if (canvas) render(t, canvas, g[0], g[1], kind > 0);
+    c.t.put(kLabels[kind]);
+    c.t.nums(" canvas h w offset y x", geometry, 5);
+    if (canvas) render(c.t, canvas, g[0], g[1], kind > 0);
     free(canvas);
   }
-  if (!r.guards_intact()) t.put("guard bytes written\n");
+  if (!r.guards_intact()) c.t.put("guard bytes written\n");
 }
 
 // point <raster> h w percent key: brighten, darken and the key's mask, each into a second raster
 // and in place (the two must agree).
-void point(Text &t, Args a, Specs s) {
-  const uint32_t h = as<uint32_t>(a[0]), w = as<uint32_t>(a[1]);
+void point(Call &c) {
+  static const char *const kLabels[] = {"brighten\n", "darken\n", "mask\n"};
   for (int op = 0; op < 3; ++op) {
-    Raster src(s[0], a[0], a[1]), out(Spec{'c', 77}, a[0], a[1]);
-    for (int in_place = 0; in_place < 2; ++in_place) {
-      uint8_t *dst = in_place ? src.data() : out.data();
-      if (op == 0) kel_image_brighten(src.data(), h, w, as<uint32_t>(a[2]), dst);
-      if (op == 1) kel_image_darken(src.data(), h, w, as<uint32_t>(a[2]), dst);
-      if (op == 2) kel_get_mask(src.data(), h, w, as<int32_t>(a[3]), dst);
+    Raster src(c.s[0], c.a[0], c.a[1]), out(Spec{'c', 77}, c.a[0], c.a[1]);
+    for (uint8_t *dst : {out.data(), src.data()}) {
+      if (op == 0) kel_image_brighten(src.data(), c.u(0), c.u(1), c.u(2), dst);
+      if (op == 1) kel_image_darken(src.data(), c.u(0), c.u(1), c.u(2), dst);
+      if (op == 2) kel_get_mask(src.data(), c.u(0), c.u(1), c.i(3), dst);
     }
-    t.put(op == 0 ? "brighten\n" : op == 1 ? "darken\n" : "mask\n");
-    render(t, out);
-    if (memcmp(src.data(), out.data(), out.n) != 0 || !src.guards_intact())
-      t.put("in place differs\n");
+    c.t.put(kLabels[op]);
+    render(c.t, out);
+    if (memcmp(src.data(), out.data(), out.n) || !src.guards_intact())
+      c.t.put("in place differs\n");
   }
 }
 
 // compose <dst> dh dw <src> sh sw x y key [overlap]: paste, then blend, of src onto dst; with
 // overlap the source is dst's own memory from that byte on.
-void compose(Text &t, Args a, Specs s, int n) {
-  for (int blend = 0; blend < 2; ++blend) {
-    Raster dst(s[0], a[0], a[1]), src(s[1], a[2], a[3]);
-    const uint8_t *from = n > 7 ? dst.data() + a[7] : src.data();
-    auto call = blend ? kel_image_blend_image : kel_image_draw_image;
-    call(dst.data(), as<int32_t>(a[0]), as<int32_t>(a[1]), from, as<uint16_t>(a[2]),
-         as<uint16_t>(a[3]), as<int32_t>(a[4]), as<int32_t>(a[5]), as<uint16_t>(a[6]));
-    t.put(blend ? "blend\n" : "paste\n");
-    render(t, dst);
+void compose(Call &c) {
+  for (auto call : {kel_image_draw_image, kel_image_blend_image}) {
+    Raster dst(c.s[0], c.a[0], c.a[1]), src(c.s[1], c.a[2], c.a[3]);
+    const uint8_t *from = c.n > 7 ? dst.data() + c.a[7] : src.data();
+    call(dst.data(), c.i(0), c.i(1), from, c.u16(2), c.u16(3), c.i(4), c.i(5), c.u16(6));
+    c.t.put(call == kel_image_draw_image ? "paste\n" : "blend\n");
+    render(c.t, dst);
   }
 }
 
 // fill <raster> h w <mask> [in place]: the masked fill.
-void fill(Text &t, Args a, Specs s, int n) {
-  Raster src(s[0], a[0], a[1]), mask(s[1], a[0], a[1]), dst(Spec{'c', 77}, a[0], a[1]);
-  uint8_t *out = n > 2 ? src.data() : dst.data();
-  kel_mask_image(src.data(), as<uint16_t>(a[0]), as<uint16_t>(a[1]), mask.data(), out);
-  render(t, n > 2 ? src : dst);
+void fill(Call &c) {
+  Raster src(c.s[0], c.a[0], c.a[1]), mask(c.s[1], c.a[0], c.a[1]),
+      dst(Spec{'c', 77}, c.a[0], c.a[1]);
+  Raster &out = c.n > 2 ? src : dst;
+  kel_mask_image(src.data(), c.u16(0), c.u16(1), mask.data(), out.data());
+  render(c.t, out);
 }
 
-// Drawings: <background> h w then the routine's own arguments, colour last.
-void line(Text &t, Args a, Specs s) {
-  Raster r(s[0], a[0], a[1]);
-  kel_image_draw_line(r.data(), as<int32_t>(a[0]), as<int32_t>(a[1]), as<int32_t>(a[2]),
-                      as<int32_t>(a[3]), as<int32_t>(a[4]), as<int32_t>(a[5]), as<uint8_t>(a[6]));
-  render_drawing(t, r, s[0], as<uint8_t>(a[6]));
+// Drawings: <background> h w, then the routine's own arguments, colour last.
+void drawing(Call &c) {
+  Raster r(c.s[0], c.a[0], c.a[1]);
+  uint8_t *p = r.data();
+  const uint8_t colour = c.u8(c.n - 1);
+  switch (c.n) {
+    case 6:
+      kel_image_draw_circle(p, c.i(0), c.i(1), c.u(2), c.i(3), c.i(4), colour);
+      break;
+    case 7:
+      kel_image_draw_line(p, c.i(0), c.i(1), c.i(2), c.i(3), c.i(4), c.i(5), colour);
+      break;
+    case 9:
+      kel_image_draw_triangle(p, c.i(0), c.i(1), c.i(2), c.i(3), c.i(4), c.i(5), c.i(6), c.i(7),
+                              colour);
+      break;
+  }
+  render_drawing(c.t, r, c.s[0], colour);
 }
-void triangle(Text &t, Args a, Specs s) {
-  Raster r(s[0], a[0], a[1]);
-  kel_image_draw_triangle(r.data(), as<int32_t>(a[0]), as<int32_t>(a[1]), as<int32_t>(a[2]),
-                          as<int32_t>(a[3]), as<int32_t>(a[4]), as<int32_t>(a[5]),
-                          as<int32_t>(a[6]), as<int32_t>(a[7]), as<uint8_t>(a[8]));
-  render_drawing(t, r, s[0], as<uint8_t>(a[8]));
+void rect(Call &c) {
+  Raster r(c.s[0], c.a[0], c.a[1]);
+  kel_image_draw_rectangle(r.data(), c.i(0), c.i(1), c.i(2), c.i(3), c.u(4), c.u(5), c.u8(6));
+  render_drawing(c.t, r, c.s[0], c.u8(6));
 }
-void rect(Text &t, Args a, Specs s) {
-  Raster r(s[0], a[0], a[1]);
-  kel_image_draw_rectangle(r.data(), as<int32_t>(a[0]), as<int32_t>(a[1]), as<int32_t>(a[2]),
-                           as<int32_t>(a[3]), as<uint32_t>(a[4]), as<uint32_t>(a[5]),
-                           as<uint8_t>(a[6]));
-  render_drawing(t, r, s[0], as<uint8_t>(a[6]));
-}
-void number(Text &t, Args a, Specs s) {
-  Raster r(s[0], a[0], a[1]);
-  kel_image_draw_number(r.data(), as<int32_t>(a[0]), as<int32_t>(a[1]), as<int32_t>(a[2]),
-                        as<uint8_t>(a[3]), as<int32_t>(a[4]), as<int32_t>(a[5]), as<uint8_t>(a[6]));
-  render_drawing(t, r, s[0], as<uint8_t>(a[6]));
-}
-void circle(Text &t, Args a, Specs s) {
-  Raster r(s[0], a[0], a[1]);
-  kel_image_draw_circle(r.data(), as<int32_t>(a[0]), as<int32_t>(a[1]), as<uint32_t>(a[2]),
-                        as<int32_t>(a[3]), as<int32_t>(a[4]), as<uint8_t>(a[5]));
-  render_drawing(t, r, s[0], as<uint8_t>(a[5]));
+void number(Call &c) {
+  Raster r(c.s[0], c.a[0], c.a[1]);
+  kel_image_draw_number(r.data(), c.i(0), c.i(1), c.i(2), c.u8(3), c.i(4), c.i(5), c.u8(6));
+  render_drawing(c.t, r, c.s[0], c.u8(6));
 }
 
 // The outside functions. trig first count: cosine and sine of consecutive angles; sqrt x step
-// count: roots of x, x + step, ... (wrapping); blur <raster> h w; scale <raster> h w factor oh ow.
-void trig(Text &t, Args a, Specs) {
-  for (int64_t i = 0; i < a[1]; ++i) {
-    const uint8_t angle = as<uint8_t>(a[0] + i);
+// count: roots of x, x + step, ... (wrapping); blur <raster> h w [in place];
+// scale <raster> h w factor out_h out_w.
+void trig(Call &c) {
+  for (int64_t k = 0; k < c.a[1]; ++k) {
+    const auto angle = static_cast<uint8_t>(c.a[0] + k);
     const int64_t v[] = {angle, tq_cos_(angle), tq_sin_(angle)};
-    t.nums("angle cos sin", v, 3);
+    c.t.nums("angle cos sin", v, 3);
   }
 }
-void sqrt_rows(Text &t, Args a, Specs) {
-  for (int64_t i = 0; i < a[2]; ++i) {
-    const uint32_t x = as<uint32_t>(a[0] + i * a[1]);
+void sqrt_rows(Call &c) {
+  for (int64_t k = 0; k < c.a[2]; ++k) {
+    const auto x = static_cast<uint32_t>(c.a[0] + k * c.a[1]);
     const int64_t v[] = {x, tq_sqrt_24_5(x)};
-    t.nums("x root", v, 2);
+    c.t.nums("x root", v, 2);
   }
 }
-void blur(Text &t, Args a, Specs s, int n) {
-  Raster in(s[0], a[0], a[1]), out(Spec{'c', 77}, a[0], a[1]);
-  kel_blur_uint8(in.data(), as<uint16_t>(a[0]), as<uint16_t>(a[1]), n > 2 ? in.data() : out.data());
-  render(t, n > 2 ? in : out);
+void blur(Call &c) {
+  Raster in(c.s[0], c.a[0], c.a[1]), out(Spec{'c', 77}, c.a[0], c.a[1]);
+  kel_blur_uint8(in.data(), c.u16(0), c.u16(1), c.n > 2 ? in.data() : out.data());
+  render(c.t, c.n > 2 ? in : out);
 }
-void scale(Text &t, Args a, Specs s) {
-  Raster in(s[0], a[0], a[1]), out(Spec{'c', 77}, a[3], a[4]);
-  kel_scale_up_bilinear_uint8(in.data(), as<uint16_t>(a[0]), as<uint16_t>(a[1]), as<uint16_t>(a[2]),
-                              out.data(), as<uint16_t>(a[3]), as<uint16_t>(a[4]));
-  render(t, out);
+void scale(Call &c) {
+  Raster in(c.s[0], c.a[0], c.a[1]), out(Spec{'c', 77}, c.a[3], c.a[4]);
+  kel_scale_up_bilinear_uint8(in.data(), c.u16(0), c.u16(1), c.u16(2), out.data(), c.u16(3),
+                              c.u16(4));
+  render(c.t, out);
 }
 
 // The routines by name, with how many numbers they take at least and at most.
 struct Routine {
   const char *name;
   int min_args, max_args;
-  void (*run)(Text &, Args, Specs, int);
+  void (*run)(Call &);
 };
-template <void (*F)(Text &, Args, Specs)>
-void fixed(Text &t, Args a, Specs s, int) {
-  F(t, a, s);
-}
 const Routine kRoutines[] = {
-    {"image", 4, 4, fixed<image>},    {"offset", 4, 4, fixed<offset>},
-    {"rows", 2, 2, fixed<rows>},      {"pixel", 5, 5, fixed<pixel>},
-    {"stats", 3, 3, fixed<stats>},    {"hstat", 4, 4, fixed<hstat>},
-    {"rotate", 3, 3, fixed<rotate>},  {"point", 4, 4, fixed<point>},
-    {"compose", 7, 8, compose},       {"fill", 2, 3, fill},
-    {"line", 7, 7, fixed<line>},      {"triangle", 9, 9, fixed<triangle>},
-    {"rect", 7, 7, fixed<rect>},      {"number", 7, 7, fixed<number>},
-    {"circle", 6, 6, fixed<circle>},  {"trig", 2, 2, fixed<trig>},
-    {"sqrt", 3, 3, fixed<sqrt_rows>}, {"blur", 2, 3, blur},
-    {"scale", 5, 5, fixed<scale>},
+    {"image", 4, 4, image},   {"offset", 4, 4, offset},  {"rows", 2, 2, rows},
+    {"pixel", 5, 5, pixel},   {"stats", 3, 3, stats},    {"hstat", 4, 4, hstat},
+    {"rotate", 3, 3, rotate}, {"point", 4, 4, point},    {"compose", 7, 8, compose},
+    {"fill", 2, 3, fill},     {"line", 7, 7, drawing},   {"triangle", 9, 9, drawing},
+    {"rect", 7, 7, rect},     {"number", 7, 7, number},  {"circle", 6, 6, drawing},
+    {"trig", 2, 2, trig},     {"sqrt", 3, 3, sqrt_rows}, {"blur", 2, 3, blur},
+    {"scale", 5, 5, scale},
 };
 
 // ---------------------------------------------------------------------------------------------
@@ -478,7 +466,8 @@ bool compute(const Row &row, Text &t) {
   }
   for (const Routine &r : kRoutines) {
     if (strcmp(r.name, name) == 0 && na >= r.min_args && na <= r.max_args) {
-      r.run(t, a, s, na);
+      Call call{t, a, s, na};
+      r.run(call);
       return true;
     }
   }
