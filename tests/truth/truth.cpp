@@ -85,31 +85,18 @@ uint32_t next(uint32_t &s) {
 void generate(Spec spec, uint8_t *p, int64_t h, int64_t w) {
   static const uint8_t kExtremes[] = {0, 1, 2, 126, 127, 128, 129, 253, 254, 255};
   uint32_t s = spec.n * 2654435761u + 1;
-  const size_t n = h > 0 && w > 0 ? static_cast<size_t>(h * w) : 0;
-  for (size_t i = 0; i < n; ++i) {
+  const int64_t n = h > 0 && w > 0 ? h * w : 0;
+  for (int64_t i = 0; i < n; ++i) {
     const uint32_t r = next(s) >> 8;
-    switch (spec.kind) {
-      case 'r':
-        p[i] = static_cast<uint8_t>(r);
-        break;
-      case 'k':
-        p[i] = static_cast<uint8_t>(r & 3);
-        break;
-      case 'e':
-        p[i] = kExtremes[r % 10];
-        break;
-      case 'g':
-        p[i] = static_cast<uint8_t>(10 * (i / static_cast<size_t>(w)) + i % static_cast<size_t>(w));
-        break;
-      case 'b':
-        p[i] = 1;
-        break;
-      default:
-        p[i] = static_cast<uint8_t>(spec.n);
-    }
+    const int64_t v = spec.kind == 'r'   ? r
+                      : spec.kind == 'k' ? r & 3
+                      : spec.kind == 'e' ? kExtremes[r % 10]
+                      : spec.kind == 'g' ? 10 * (i / w) + i % w
+                      : spec.kind == 'b' ? 1
+                                         : spec.n;
+    p[i] = static_cast<uint8_t>(v);
   }
-  for (int holes = spec.kind == 'b' ? 1 + static_cast<int>(next(s) % 3) : 0; holes > 0 && n;
-       --holes) {
+  for (uint32_t holes = spec.kind == 'b' && n ? 1 + next(s) % 3 : 0; holes > 0; --holes) {
     const int64_t y0 = next(s) % h, x0 = next(s) % w;
     const int64_t y1 = y0 + 1 + next(s) % h, x1 = x0 + 1 + next(s) % w;
     for (int64_t y = y0; y < y1 && y < h; ++y) {
@@ -158,19 +145,14 @@ void render(Text &t, const Raster &r) {
   if (!r.guards_intact()) t.put("guard bytes written\n");
 }
 void render_drawing(Text &t, const Raster &r, Spec bg, uint8_t colour) {
-  for (int64_t y = 0; y < r.h; ++y) {
-    for (int64_t x = 0; x < r.w; ++x) {
-      const uint8_t v = r.data()[y * r.w + x];
-      if (v == colour)
-        t.put("X");
-      else if (v == 255 - colour)
-        t.put("o");
-      else if (bg.kind == 'c' && v == bg.n)
-        t.put(".");
-      else
-        t.put("("), t.num(v), t.put(")");
+  for (int64_t k = 0; k < r.h * r.w; ++k) {
+    const uint8_t v = r.data()[k];
+    if (v == colour || v == 255 - colour || (bg.kind == 'c' && v == bg.n)) {
+      t.put(v == colour ? "X" : v == 255 - colour ? "o" : ".");
+    } else {
+      t.put("("), t.num(v), t.put(")");
     }
-    t.put("\n");
+    if ((k + 1) % r.w == 0) t.put("\n");
   }
   if (!r.guards_intact()) t.put("guard bytes written\n");
 }
