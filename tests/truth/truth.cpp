@@ -534,7 +534,7 @@ int write_table(const char *path) {
     if (row.picture) {
       if (!ok || !matches(row, t))
         ++bad, printf("picture differs: %.*s\n%s", static_cast<int>(row.end - row.begin), row.begin,
-                      t.chars);
+                      t.chars ? t.chars : "");
       return;
     }
     if (!ok) ++bad, printf("bad row: %.*s\n", static_cast<int>(row.end - row.begin), row.begin);

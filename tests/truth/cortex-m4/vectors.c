@@ -3,11 +3,13 @@
  * the host sees (through semihosting) instead of hanging the emulator. */
 #include <stdlib.h>
 
+typedef void (*Handler)(void);
 extern char __stack[];
 void _start(void);
 
-static void fault(void) { _Exit(99); }
+static void fault(void) {
+  _Exit(99);
+}
 
-__attribute__((section(".vectors"), used)) static void (*const vectors[16])(void) = {
-    (void (*)(void))__stack, _start, fault, fault, fault, fault, fault, 0, 0, 0, 0, fault, fault,
-    0, fault, fault};
+__attribute__((section(".vectors"), used)) static const Handler vectors[16] = {
+    [0] = (Handler)__stack, [1] = _start, [2 ... 15] = fault};
