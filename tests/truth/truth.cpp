@@ -275,24 +275,35 @@ void hstat(Call &c) {
 void rotate(Call &c) {
   Raster r(c.s[0], c.a[0], c.a[1]);
   const auto *signed_src = reinterpret_cast<const int8_t *>(r.data());
-  static const char *const kLabels[] = {"u8", "s8", "nn"};
+  uint8_t *canvas[3] = {};
+  auto **signed_canvas = reinterpret_cast<int8_t **>(canvas);
+  int32_t g[3][4];
+  kel_image_rotate(r.data(), c.u(0), c.u(1), c.u8(2), canvas, g[0], g[0] + 1, g[0] + 2, g[0] + 3);
+  kel_image_rotate_int8(signed_src, c.u(0), c.u(1), c.u8(2), signed_canvas + 1, g[1], g[1] + 1,
+                        g[1] + 2, g[1] + 3);
+  kel_image_rotate_int8_nn(signed_src, c.i(0), c.i(1), c.u8(2), signed_canvas + 2, g[2], g[2] + 1,
+                           g[2] + 2, g[2] + 3);
   for (int kind = 0; kind < 3; ++kind) {
-    uint8_t *canvas = nullptr;
-    auto **signed_canvas = reinterpret_cast<int8_t **>(&canvas);
-    int32_t g[4] = {-9, -9, -9, -9};
-    if (kind == 0)
-      kel_image_rotate(r.data(), c.u(0), c.u(1), c.u8(2), &canvas, g, g + 1, g + 2, g + 3);
-    if (kind == 1)
-      kel_image_rotate_int8(signed_src, c.u(0), c.u(1), c.u8(2), signed_canvas, g, g + 1, g + 2,
-                            g + 3);
-    if (kind == 2)
-      kel_image_rotate_int8_nn(signed_src, c.i(0), c.i(1), c.u8(2), signed_canvas, g, g + 1, g + 2,
-                               g + 3);
-    const int64_t geometry[] = {g[0], g[1], g[2], g[3], canvas != nullptr};
-    c.t.put(kLabels[kind]);
-    c.t.nums(" canvas h w offset y x", geometry, 5);
-    if (canvas) render(c.t, canvas, g[0], g[1], kind > 0);
-    free(canvas);
+    const int64_t geometry[] = {g[kind][0], g[kind][1], g[kind][2], g[kind][3],
+                                canvas[kind] != nullptr};
+    c.t.nums(kind == 0 ? "u8 canvas h w, offset y x, made" : kind == 1 ? "s8" : "nn", geometry, 5);
+  }
+  // The canvases row by row side by side, u8 | s8 | nn, where all three have the same size.
+  const bool alike = canvas[0] && canvas[1] && canvas[2] && !memcmp(g[0], g[1], sizeof g[0]) &&
+                     !memcmp(g[0], g[2], sizeof g[0]);
+  for (int64_t y = 0; y < (alike ? g[0][0] : 0); ++y) {
+    for (int kind = 0; kind < 3; ++kind) {
+      if (kind) c.t.put(" |");
+      for (int64_t x = 0; x < g[0][1]; ++x) {
+        const uint8_t v = canvas[kind][y * g[0][1] + x];
+        c.t.put(x || kind ? " " : ""), c.t.num(kind ? static_cast<int8_t>(v) : v);
+      }
+    }
+    c.t.put("\n");
+  }
+  for (int kind = 0; kind < 3; ++kind) {
+    if (canvas[kind] && !alike) render(c.t, canvas[kind], g[kind][0], g[kind][1], kind > 0);
+    free(canvas[kind]);
   }
   if (!r.guards_intact()) c.t.put("guard bytes written\n");
 }
