@@ -49,12 +49,8 @@ struct Text {
   void put(const char *s) { put(s, strlen(s)); }
   void num(int64_t v) {
     char digits[24];
-    int i = 24;
-    uint64_t u = v < 0 ? 0 - static_cast<uint64_t>(v) : static_cast<uint64_t>(v);
-    do digits[--i] = static_cast<char>('0' + u % 10);
-    while ((u /= 10) != 0);
-    if (v < 0) digits[--i] = '-';
-    put(digits + i, static_cast<size_t>(24 - i));
+    put(digits,
+        static_cast<size_t>(snprintf(digits, sizeof digits, "%lld", static_cast<long long>(v))));
   }
   void nums(const char *label, const int64_t *v, int n) {
     put(label);
