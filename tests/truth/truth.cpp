@@ -161,6 +161,7 @@ struct Call {
   const int64_t *a;
   const Spec *s;
   int n;  // how many numbers the row gave
+  const char *name;
   int32_t i(int k) const { return static_cast<int32_t>(a[k]); }
   uint32_t u(int k) const { return static_cast<uint32_t>(a[k]); }
   uint16_t u16(int k) const { return static_cast<uint16_t>(a[k]); }
@@ -348,29 +349,16 @@ void drawing(Call &c) {
   Raster r(c.s[0], c.a[0], c.a[1]);
   uint8_t *p = r.data();
   const uint8_t colour = c.u8(c.n - 1);
-  switch (c.n) {
-    case 6:
-      kel_image_draw_circle(p, c.i(0), c.i(1), c.u(2), c.i(3), c.i(4), colour);
-      break;
-    case 7:
-      kel_image_draw_line(p, c.i(0), c.i(1), c.i(2), c.i(3), c.i(4), c.i(5), colour);
-      break;
-    case 9:
-      kel_image_draw_triangle(p, c.i(0), c.i(1), c.i(2), c.i(3), c.i(4), c.i(5), c.i(6), c.i(7),
-                              colour);
-      break;
+  const char f = c.name[0];
+  if (f == 'l') kel_image_draw_line(p, c.i(0), c.i(1), c.i(2), c.i(3), c.i(4), c.i(5), colour);
+  if (f == 'r') kel_image_draw_rectangle(p, c.i(0), c.i(1), c.i(2), c.i(3), c.u(4), c.u(5), colour);
+  if (f == 'n') kel_image_draw_number(p, c.i(0), c.i(1), c.i(2), c.u8(3), c.i(4), c.i(5), colour);
+  if (f == 'c') kel_image_draw_circle(p, c.i(0), c.i(1), c.u(2), c.i(3), c.i(4), colour);
+  if (f == 't') {
+    kel_image_draw_triangle(p, c.i(0), c.i(1), c.i(2), c.i(3), c.i(4), c.i(5), c.i(6), c.i(7),
+                            colour);
   }
   render_drawing(c.t, r, c.s[0], colour);
-}
-void rect(Call &c) {
-  Raster r(c.s[0], c.a[0], c.a[1]);
-  kel_image_draw_rectangle(r.data(), c.i(0), c.i(1), c.i(2), c.i(3), c.u(4), c.u(5), c.u8(6));
-  render_drawing(c.t, r, c.s[0], c.u8(6));
-}
-void number(Call &c) {
-  Raster r(c.s[0], c.a[0], c.a[1]);
-  kel_image_draw_number(r.data(), c.i(0), c.i(1), c.i(2), c.u8(3), c.i(4), c.i(5), c.u8(6));
-  render_drawing(c.t, r, c.s[0], c.u8(6));
 }
 
 // The outside functions. trig first count: cosine and sine of consecutive angles; sqrt x step
@@ -413,7 +401,7 @@ const Routine kRoutines[] = {
     {"pixel", 5, 5, pixel},   {"stats", 3, 3, stats},    {"hstat", 4, 4, hstat},
     {"rotate", 3, 3, rotate}, {"point", 4, 4, point},    {"compose", 7, 8, compose},
     {"fill", 2, 3, fill},     {"line", 7, 7, drawing},   {"triangle", 9, 9, drawing},
-    {"rect", 7, 7, rect},     {"number", 7, 7, number},  {"circle", 6, 6, drawing},
+    {"rect", 7, 7, drawing},  {"number", 7, 7, drawing}, {"circle", 6, 6, drawing},
     {"trig", 2, 2, trig},     {"sqrt", 3, 3, sqrt_rows}, {"blur", 2, 3, blur},
     {"scale", 5, 5, scale},
 };
@@ -455,7 +443,7 @@ bool compute(const Row &row, Text &t) {
   }
   for (const Routine &r : kRoutines) {
     if (strcmp(r.name, name) == 0 && na >= r.min_args && na <= r.max_args) {
-      Call call{t, a, s, na};
+      Call call{t, a, s, na, name};
       r.run(call);
       return true;
     }
