@@ -141,14 +141,14 @@ void render(Text &t, const Raster &r) {
   if (!r.guards_intact()) t.put("guard bytes written\n");
 }
 void render_drawing(Text &t, const Raster &r, Spec bg, uint8_t colour) {
-  for (int64_t k = 0; k < r.h * r.w; ++k) {
+  for (size_t k = 0; k < r.n; ++k) {
     const uint8_t v = r.data()[k];
     if (v == colour || v == 255 - colour || (bg.kind == 'c' && v == bg.n)) {
       t.put(v == colour ? "X" : v == 255 - colour ? "o" : ".");
     } else {
       t.put("("), t.num(v), t.put(")");
     }
-    if ((k + 1) % r.w == 0) t.put("\n");
+    if ((k + 1) % static_cast<size_t>(r.w) == 0) t.put("\n");
   }
   if (!r.guards_intact()) t.put("guard bytes written\n");
 }
