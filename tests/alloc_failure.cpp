@@ -1,7 +1,7 @@
 // What the routines that allocate do when malloc fails, and that no routine takes memory any
-// other way. The program is linked with --wrap for malloc, calloc, realloc, free and the outside
-// functions, so the stand-ins below see every call the library makes; only a static build can
-// be wrapped this way.
+// other way. The program is linked with --wrap for malloc, free, the other allocators and the
+// outside functions, so the stand-ins below see every call the library makes; only a static
+// build can be wrapped this way.
 #include <gtest/gtest.h>
 #include <sys/mman.h>
 #include <unistd.h>
@@ -19,6 +19,10 @@ extern "C" {
 void *__real_malloc(size_t size);
 void *__real_calloc(size_t count, size_t size);
 void *__real_realloc(void *block, size_t size);
+void *__real_aligned_alloc(size_t alignment, size_t size);
+int __real_posix_memalign(void **block, size_t alignment, size_t size);
+void *__real__Znwm(size_t size);  // operator new
+void *__real__Znam(size_t size);  // operator new[]
 void __real_free(void *block);
 int32_t __real_tq_cos_(uint8_t angle);
 int32_t __real_tq_sin_(uint8_t angle);
@@ -32,12 +36,13 @@ namespace {
 
 // What one armed call did. Single-threaded: nothing but the call under test runs while armed.
 struct Seen {
-  int mallocs = 0, live = 0, foreign = 0;  // foreign: calloc and realloc, which we never use
+  int mallocs = 0, live = 0;
+  int foreign = 0;  // calloc, realloc, aligned allocations, operator new: never ours to call
   int cos = 0, sin = 0, blur = 0, scale = 0;
   bool operator==(const Seen &o) const { return std::memcmp(this, &o, sizeof o) == 0; }
 };
 std::ostream &operator<<(std::ostream &o, const Seen &s) {
-  return o << "mallocs " << s.mallocs << ", live " << s.live << ", calloc/realloc " << s.foreign
+  return o << "mallocs " << s.mallocs << ", live " << s.live << ", other allocations " << s.foreign
            << ", cos " << s.cos << ", sin " << s.sin << ", blur " << s.blur << ", scale "
            << s.scale;
 }
@@ -70,6 +75,22 @@ void *__wrap_calloc(size_t count, size_t size) {
 void *__wrap_realloc(void *block, size_t size) {
   g_seen.foreign += g_armed;
   return __real_realloc(block, size);
+}
+void *__wrap_aligned_alloc(size_t alignment, size_t size) {
+  g_seen.foreign += g_armed;
+  return __real_aligned_alloc(alignment, size);
+}
+int __wrap_posix_memalign(void **block, size_t alignment, size_t size) {
+  g_seen.foreign += g_armed;
+  return __real_posix_memalign(block, alignment, size);
+}
+void *__wrap__Znwm(size_t size) {
+  g_seen.foreign += g_armed;
+  return __real__Znwm(size);
+}
+void *__wrap__Znam(size_t size) {
+  g_seen.foreign += g_armed;
+  return __real__Znam(size);
 }
 void __wrap_free(void *block) {
   g_seen.live -= g_armed && block;
