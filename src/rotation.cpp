@@ -187,7 +187,10 @@ struct SignedNearest {
 
 // The canvas, every pixel set to the fill; null when malloc fails.
 void *allocate_canvas(size_t bytes, uint8_t fill) {
-  void *block = std::malloc(bytes);
+  // Taken back through a volatile so that no compiler merges this malloc and a fill of 0 into
+  // calloc: the header promises malloc, and hosts that count on it may provide no calloc.
+  void *volatile fresh = std::malloc(bytes);
+  void *block = fresh;
   if (block != nullptr) std::memset(block, fill, bytes);
   return block;
 }
