@@ -192,28 +192,26 @@ int hist_std(ArrayArgument hist, int64_t mean, int64_t count) {
   return kel_hist_std(bins, m, n);
 }
 
-py::tuple var(ArrayArgument img) {
+// var and std: the statistic and the truncated mean that the routine stores beside it.
+template <typename Statistic>
+py::tuple image_statistic(ArrayArgument img,
+                          Statistic (*routine)(const uint8_t *, int32_t, int32_t, uint8_t *)) {
   auto source = picture<const uint8_t>(img, "img");
   auto [height, width] = sides<int32_t>(source, "img", kMaxCountedPixels);
   uint8_t mean = 0;
-  uint16_t variance = 0;
+  Statistic value = 0;
   {
     py::gil_scoped_release unlocked;
-    variance = kel_image_var(source.pixels, height, width, &mean);
+    value = routine(source.pixels, height, width, &mean);
   }
-  return py::make_tuple(variance, mean);
+  return py::make_tuple(value, mean);
 }
 
+py::tuple var(ArrayArgument img) {
+  return image_statistic(img, kel_image_var);
+}
 py::tuple std_dev(ArrayArgument img) {
-  auto source = picture<const uint8_t>(img, "img");
-  auto [height, width] = sides<int32_t>(source, "img", kMaxCountedPixels);
-  uint8_t mean = 0;
-  uint8_t deviation = 0;
-  {
-    py::gil_scoped_release unlocked;
-    deviation = kel_image_std(source.pixels, height, width, &mean);
-  }
-  return py::make_tuple(deviation, mean);
+  return image_statistic(img, kel_image_std);
 }
 
 // The canvas and the corner's place on it, the canvas handed to numpy with free as its release.
