@@ -12,6 +12,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <iterator>
 #include <limits>
 #include <utility>
 
@@ -306,12 +307,12 @@ void draw_circle(const Raster &raster, uint32_t diameter, int64_t x, int64_t y, 
   const int64_t edge_y_last = edge_y + edge - 1;
 
   // Edges first, then the four diagonal runs; each j of a diagonal is one step of its run.
-  const int64_t starts[8][2] = {{edge_x, top},       {edge_x, bottom},    {left, edge_y},
-                                {right, edge_y},     {left, edge_y},      {right, edge_y},
-                                {left, edge_y_last}, {right, edge_y_last}};
+  const int64_t starts[][2] = {{edge_x, top},       {edge_x, bottom},    {left, edge_y},
+                               {right, edge_y},     {left, edge_y},      {right, edge_y},
+                               {left, edge_y_last}, {right, edge_y_last}};
   const Steps along_edge{0, edge};
   const Steps along_diagonal{1, diagonal + 1};
-  for (int run = 0; run < 8; ++run) {
+  for (size_t run = 0; run < std::size(starts); ++run) {
     draw_run(raster, starts[run][0], starts[run][1], kCircleSteps[run][0], kCircleSteps[run][1],
              run < 4 ? along_edge : along_diagonal, colour);
   }
