@@ -95,11 +95,11 @@ KEL_API void kel_set_pixel(uint8_t *buf, uint32_t height, uint32_t width, uint32
 /* Integer statistics of a plain raster's intensities. The pixel count is height * width as a
  * 32-bit product (wrapping); when that product is 0 or negative read as signed, no pixel is
  * read. Sizes are the caller's to keep non-negative: two negative sizes give a positive product,
- * and that many pixels are read. Sums are unsigned 32-bit and wrap modulo 2^32, divisions truncate, and the variance is
- * the population variance about the truncated mean. A count of 0 gives 0 instead of a division
- * by zero. Histograms belong to the caller and must not overlap src. Counting takes a few words
- * of stack (3 KiB more in builds with vector variants), and so do the image statistics, which
- * keep no histogram. */
+ * and that many pixels are read. Sums are unsigned 32-bit and wrap modulo 2^32, divisions
+ * truncate, and the variance is the population variance about the truncated mean. A count of 0
+ * gives 0 instead of a division by zero. Histograms belong to the caller and must not overlap
+ * src. Counting takes a few words of stack (3 KiB more in builds with vector variants), and so
+ * do the image statistics, which keep no histogram. */
 
 /* Clears all 256 bins of hist, then counts every pixel into the bin of its value. */
 KEL_API void kel_image_histogram(const uint8_t *src, int32_t height, int32_t width, uint32_t *hist);
