@@ -124,8 +124,8 @@ KEL_API uint16_t kel_hist_var(const uint32_t *hist, uint8_t mean, uint32_t count
 KEL_API uint8_t kel_hist_std(const uint32_t *hist, uint8_t mean, uint32_t count);
 
 /* The variance of the image's intensities, equal to kel_hist_var of its histogram, taken in one
- * pass over the pixels (nothing is allocated). Stores the truncated mean in *mean_out unless mean_out is null. An image with no
- * pixels gives variance 0 and mean 0. */
+ * pass over the pixels (nothing is allocated). Stores the truncated mean in *mean_out unless
+ * mean_out is null. An image with no pixels gives variance 0 and mean 0. */
 KEL_API uint16_t kel_image_var(const uint8_t *src, int32_t height, int32_t width,
                                uint8_t *mean_out);
 
