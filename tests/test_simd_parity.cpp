@@ -158,6 +158,39 @@ TEST(SimdParity, BrightenAndDarkenEveryPercentageAndPixel) {
   });
 }
 
+// An input row at each 4-byte offset from its output's alignment, which AVX-512 reads as pairs
+// of aligned vectors joined.
+TEST(SimdParity, RowsAtEachOffsetFromTheOutput) {
+  std::mt19937 rng(15);
+  Bytes buffer(16384 + 64);
+  for (uint8_t &p : buffer) p = static_cast<uint8_t>(rng());
+  const Bytes original = buffer;
+  uint8_t *const out = buffer.data() + (64 - reinterpret_cast<uintptr_t>(buffer.data()) % 64) % 64;
+  for_each_variant([&] {
+    for (size_t offset = 0; offset < 64; offset += 4) {
+      for (const size_t length : {size_t{5000}, size_t{190}}) {
+        const uint8_t *in = out + 8192 + offset;
+        const auto same = [&](auto plain_row, auto vector_row, auto... args) {
+          Bytes expected(out, out + length);
+          plain_row(in, length, args..., expected.data());
+          vector_row(in, length, args..., out);
+          const bool equal = std::equal(expected.begin(), expected.end(), out);
+          buffer = original;
+          return equal;
+        };
+        const uint16_t percent = 37;
+        ASSERT_TRUE(same(kel::plain::brighten_row, kel::simd::brighten_row, percent)) << offset;
+        ASSERT_TRUE(same(kel::plain::darken_row, kel::simd::darken_row, percent)) << offset;
+        ASSERT_TRUE(same(kel::plain::blend_row, kel::simd::blend_row)) << offset;
+        ASSERT_TRUE(same(kel::plain::paste_row_with_key, kel::simd::paste_row_with_key, in[5]))
+            << offset;
+        ASSERT_TRUE(same(kel::plain::blend_row_with_key, kel::simd::blend_row_with_key, in[5]))
+            << offset;
+      }
+    }
+  });
+}
+
 // Rows of paste and blend, with and without a key, on separate rows and on a destination that
 // starts before its source in the same buffer, which the vector variants may read ahead on.
 TEST(SimdParity, PasteAndBlendRows) {
