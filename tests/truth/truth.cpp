@@ -101,24 +101,31 @@ void generate(Spec spec, uint8_t *p, int64_t h, int64_t w) {
   }
 }
 
-// A raster with guard bytes on both sides; rendering it reports a touched guard.
+// A raster with guard bytes on both sides; rendering it reports a touched guard. Its pixels start
+// lead bytes past a 64-byte boundary, so that a row can put two rasters at any alignment to each
+// other, as the vector loops that join misaligned reads need to be shown.
 struct Raster {
-  static constexpr size_t kGuard = 32;
-  uint8_t *block;
+  static constexpr size_t kGuard = 64;
+  uint8_t *block, *pixels;
   int64_t h, w;
-  size_t n;
-  Raster(Spec spec, int64_t height, int64_t width) : h(height), w(width) {
+  size_t n, before;
+  Raster(Spec spec, int64_t height, int64_t width, size_t lead = 0) : h(height), w(width) {
     n = h > 0 && w > 0 ? static_cast<size_t>(h * w) : 0;
-    block = static_cast<uint8_t *>(malloc(n + 2 * kGuard));
+    block = static_cast<uint8_t *>(malloc(n + 3 * kGuard + lead));
     if (block == nullptr) abort();
-    memset(block, 0xA5, n + 2 * kGuard);
+    before = kGuard - reinterpret_cast<uintptr_t>(block) % kGuard + lead;
+    pixels = block + before;
+    memset(block, 0xA5, n + 3 * kGuard + lead);
     generate(spec, data(), h, w);
   }
   ~Raster() { free(block); }
-  uint8_t *data() const { return block + kGuard; }
+  uint8_t *data() const { return pixels; }
   bool guards_intact() const {
+    for (size_t i = 0; i < before; ++i) {
+      if (block[i] != 0xA5) return false;
+    }
     for (size_t i = 0; i < kGuard; ++i) {
-      if (block[i] != 0xA5 || block[kGuard + n + i] != 0xA5) return false;
+      if (pixels[n + i] != 0xA5) return false;
     }
     return true;
   }
@@ -305,12 +312,13 @@ void rotate(Call &c) {
   if (!r.guards_intact()) c.t.put("guard bytes written\n");
 }
 
-// point <raster> h w percent key: brighten, darken and the key's mask, each into a second raster
-// and in place (the two must agree).
+// point <raster> h w percent key [lead]: brighten, darken and the key's mask, each into a second
+// raster and in place (the two must agree); the source lies lead bytes off the output's alignment.
 void point(Call &c) {
   static const char *const kLabels[] = {"brighten\n", "darken\n", "mask\n"};
+  const size_t lead = c.n > 4 ? static_cast<size_t>(c.a[4] & 63) : 0;
   for (int op = 0; op < 3; ++op) {
-    Raster src(c.s[0], c.a[0], c.a[1]), out(Spec{'c', 77}, c.a[0], c.a[1]);
+    Raster src(c.s[0], c.a[0], c.a[1], lead), out(Spec{'c', 77}, c.a[0], c.a[1]);
     for (uint8_t *dst : {out.data(), src.data()}) {
       if (op == 0) kel_image_brighten(src.data(), c.u(0), c.u(1), c.u(2), dst);
       if (op == 1) kel_image_darken(src.data(), c.u(0), c.u(1), c.u(2), dst);
@@ -399,7 +407,7 @@ struct Routine {
 const Routine kRoutines[] = {
     {"image", 4, 4, image},   {"offset", 4, 4, offset},  {"rows", 2, 2, rows},
     {"pixel", 5, 5, pixel},   {"stats", 3, 3, stats},    {"hstat", 4, 4, hstat},
-    {"rotate", 3, 3, rotate}, {"point", 4, 4, point},    {"compose", 7, 8, compose},
+    {"rotate", 3, 3, rotate}, {"point", 4, 5, point},    {"compose", 7, 8, compose},
     {"fill", 2, 3, fill},     {"line", 7, 7, drawing},   {"triangle", 9, 9, drawing},
     {"rect", 7, 7, drawing},  {"number", 7, 7, drawing}, {"circle", 6, 6, drawing},
     {"trig", 2, 2, trig},     {"sqrt", 3, 3, sqrt_rows}, {"blur", 2, 3, blur},
