@@ -12,7 +12,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
-#include <iterator>
 #include <limits>
 #include <utility>
 
@@ -307,19 +306,22 @@ void draw_circle(const Raster &raster, uint32_t diameter, int64_t x, int64_t y, 
   const int64_t edge_y_last = edge_y + edge - 1;
 
   // Edges first, then the four diagonal runs; each j of a diagonal is one step of its run.
-  const int64_t starts[][2] = {{edge_x, top},       {edge_x, bottom},    {left, edge_y},
-                               {right, edge_y},     {left, edge_y},      {right, edge_y},
-                               {left, edge_y_last}, {right, edge_y_last}};
+  const struct {
+    int64_t x, y;
+  } starts[] = {{edge_x, top},  {edge_x, bottom}, {left, edge_y},      {right, edge_y},
+                {left, edge_y}, {right, edge_y},  {left, edge_y_last}, {right, edge_y_last}};
   const Steps along_edge{0, edge};
   const Steps along_diagonal{1, diagonal + 1};
   // Unrolled where speed counts, each run then sees its constant steps: a third fewer
   // instructions per circle. Builds for size keep the loop.
+  const int8_t(*steps)[2] = kCircleSteps;
 #if !KEL_SMALL_BUILD
 #pragma GCC unroll 8
 #endif
-  for (size_t run = 0; run < std::size(starts); ++run) {
-    draw_run(raster, starts[run][0], starts[run][1], kCircleSteps[run][0], kCircleSteps[run][1],
-             run < 4 ? along_edge : along_diagonal, colour);
+  for (const auto &start : starts) {
+    const Steps along = steps < kCircleSteps + 4 ? along_edge : along_diagonal;
+    draw_run(raster, start.x, start.y, (*steps)[0], (*steps)[1], along, colour);
+    ++steps;
   }
 }
 

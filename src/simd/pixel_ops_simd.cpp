@@ -344,18 +344,6 @@ void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *ou
 void darken_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
   HWY_DYNAMIC_DISPATCH(DarkenRow)(in, count, percent, out);
 }
-void copy_row(const uint8_t *in, size_t count, uint8_t *out) {
-  HWY_DYNAMIC_DISPATCH(CopyRow)(in, count, out);
-}
-void blend_row(const uint8_t *in, size_t count, uint8_t *out) {
-  HWY_DYNAMIC_DISPATCH(BlendRow)(in, count, out);
-}
-void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  HWY_DYNAMIC_DISPATCH(PasteRowWithKey)(in, count, key, out);
-}
-void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  HWY_DYNAMIC_DISPATCH(BlendRowWithKey)(in, count, key, out);
-}
 
 size_t end_of_last_zero(const uint8_t *bytes, size_t count) {
   return HWY_DYNAMIC_DISPATCH(EndOfLastZero)(bytes, count);

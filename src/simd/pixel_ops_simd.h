@@ -50,23 +50,15 @@ namespace simd {
 #if KEL_USE_HIGHWAY
 void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
 void darken_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
-void copy_row(const uint8_t *in, size_t count, uint8_t *out);
-void blend_row(const uint8_t *in, size_t count, uint8_t *out);
-void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
-void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 size_t end_of_last_zero(const uint8_t *bytes, size_t count);
-// The variants chosen for this machine.
+// The variants chosen for this machine, taken once per paste or blend.
 CompositeRowLoops composite_row_loops();
 #else
 // Without Highway there are no vector variants: their names stand for the plain loops.
-using plain::blend_row;
-using plain::blend_row_with_key;
 using plain::brighten_row;
 using plain::composite_row_loops;
-using plain::copy_row;
 using plain::darken_row;
 using plain::end_of_last_zero;
-using plain::paste_row_with_key;
 #endif
 
 }  // namespace simd
