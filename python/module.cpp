@@ -266,36 +266,32 @@ py::tuple rotate(ArrayArgument img, int64_t angle_value, bool nearest) {
   return canvas_result<uint8_t>(out);
 }
 
-using PointOperation = void (*)(const uint8_t *, uint32_t, uint32_t, uint32_t, uint8_t *);
-
-py::array_t<uint8_t> point_operation(PointOperation operation, ArrayArgument img, int64_t percent) {
+// brighten, darken and get_mask: a new picture from the old, given one number of the routine's
+// type (the percentage, or the key).
+template <typename Argument>
+py::array_t<uint8_t> point_operation(void (*operation)(const uint8_t *, uint32_t, uint32_t,
+                                                       Argument, uint8_t *),
+                                     ArrayArgument img, int64_t value, const char *name) {
   auto source = picture<const uint8_t>(img, "img");
   auto [height, width] = sides<uint32_t>(source, "img", kMaxPointPixels);
-  const uint32_t p = narrow<uint32_t>(percent, "percent");
+  const Argument argument = narrow<Argument>(value, name);
   auto result = new_picture<uint8_t>(source.height, source.width);
   uint8_t *out = result.mutable_data();
   py::gil_scoped_release unlocked;
-  operation(source.pixels, height, width, p, out);
+  operation(source.pixels, height, width, argument, out);
   return result;
 }
 
 py::array_t<uint8_t> brighten(ArrayArgument img, int64_t percent) {
-  return point_operation(kel_image_brighten, img, percent);
+  return point_operation(kel_image_brighten, img, percent, "percent");
 }
 
 py::array_t<uint8_t> darken(ArrayArgument img, int64_t percent) {
-  return point_operation(kel_image_darken, img, percent);
+  return point_operation(kel_image_darken, img, percent, "percent");
 }
 
 py::array_t<uint8_t> get_mask(ArrayArgument img, int64_t key) {
-  auto source = picture<const uint8_t>(img, "img");
-  auto [height, width] = sides<uint32_t>(source, "img", kMaxPointPixels);
-  const int32_t key32 = narrow<int32_t>(key, "key");
-  auto result = new_picture<uint8_t>(source.height, source.width);
-  uint8_t *mask = result.mutable_data();
-  py::gil_scoped_release unlocked;
-  kel_get_mask(source.pixels, height, width, key32, mask);
-  return result;
+  return point_operation(kel_get_mask, img, key, "key");
 }
 
 void require_same_shape(const Picture<const uint8_t> &a, const Picture<const uint8_t> &b,
