@@ -217,10 +217,13 @@ void for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Value 
 #endif
 }
 
-// At 100 percent every pixel moves the whole way, to 255 or to 0.
-void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+// Brighten (toward white) and darken (toward black) are one row loop: the change, floor(percent
+// of the distance to the target), is added or taken off. At 100 percent every pixel moves the
+// whole way, to 255 or to 0.
+template <bool kTowardWhite>
+void MoveRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
   if (percent >= 100) {
-    std::memset(out, 255, count);
+    std::memset(out, kTowardWhite ? 255 : 0, count);
     return;
   }
   const uint16_t factor = percent_factor(percent);
@@ -228,26 +231,22 @@ void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out
       in, out, count,
       [&](auto d, size_t i, const auto &load) {
         const auto pixels = load(d, in + i);
-        return hn::Add(pixels, change<true>(d, pixels, factor));
+        const auto moved = change<kTowardWhite>(d, pixels, factor);
+        return kTowardWhite ? hn::Add(pixels, moved) : hn::Sub(pixels, moved);
       },
       EveryLane(),
-      [&](size_t first, size_t n) { plain::brighten_row(in + first, n, percent, out + first); });
+      [&](size_t first, size_t n) {
+        (kTowardWhite ? plain::brighten_row : plain::darken_row)(in + first, n, percent,
+                                                                 out + first);
+      });
+}
+
+void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  MoveRow<true>(in, count, percent, out);
 }
 
 void DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
-  if (percent >= 100) {
-    std::memset(out, 0, count);
-    return;
-  }
-  const uint16_t factor = percent_factor(percent);
-  for_each_vector(
-      in, out, count,
-      [&](auto d, size_t i, const auto &load) {
-        const auto pixels = load(d, in + i);
-        return hn::Sub(pixels, change<false>(d, pixels, factor));
-      },
-      EveryLane(),
-      [&](size_t first, size_t n) { plain::darken_row(in + first, n, percent, out + first); });
+  MoveRow<false>(in, count, percent, out);
 }
 
 // Short rows copy faster this way than through memmove, which the plain loop uses.
