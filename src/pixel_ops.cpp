@@ -551,6 +551,10 @@ void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *o
   }
 }
 
+void mask_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  for (size_t i = 0; i < count; ++i) out[i] = in[i] == key ? 0 : 1;
+}
+
 // Backwards a block at a time while the blocks hold no zero, then byte by byte.
 size_t end_of_last_zero(const uint8_t *bytes, size_t count) {
   constexpr size_t kBlock = 64;
@@ -587,8 +591,8 @@ void kel_get_mask(const uint8_t *src, uint32_t height, uint32_t width, int32_t k
     std::memset(mask, 1, count);
     return;
   }
-  const uint8_t hole_value = static_cast<uint8_t>(key);
-  for (uint32_t i = 0; i < count; ++i) mask[i] = src[i] == hole_value ? 0 : 1;
+  row_loop(kel::plain::mask_row, kel::simd::mask_row, mask, src, count)(
+      src, count, static_cast<uint8_t>(key), mask);
 }
 
 void kel_image_draw_image(uint8_t *dst, int32_t dst_height, int32_t dst_width, const uint8_t *src,

@@ -35,6 +35,8 @@ void blend_row(const uint8_t *in, size_t count, uint8_t *out);
 // Where in[i] differs from key: out[i] = in[i] (paste) or (out[i] + in[i]) >> 1 (blend).
 void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+// out[i] = 0 where in[i] equals key, else 1.
+void mask_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 
 // One past the last zero byte of bytes[0 .. count), or 0 when there is none.
 size_t end_of_last_zero(const uint8_t *bytes, size_t count);
@@ -50,6 +52,7 @@ namespace simd {
 #if KEL_USE_HIGHWAY
 void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
 void darken_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
+void mask_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 size_t end_of_last_zero(const uint8_t *bytes, size_t count);
 // The variants chosen for this machine, taken once per paste or blend.
 CompositeRowLoops composite_row_loops();
@@ -59,6 +62,7 @@ using plain::brighten_row;
 using plain::composite_row_loops;
 using plain::darken_row;
 using plain::end_of_last_zero;
+using plain::mask_row;
 #endif
 
 }  // namespace simd
