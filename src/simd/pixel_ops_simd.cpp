@@ -104,25 +104,52 @@ struct LoadWhole {
   }
 };
 
-#if HWY_TARGET == HWY_AVX3
-// The shortest row whose lines are asked for ahead.
-constexpr size_t kPrefetchFrom = 4096;
+// The shortest row whose lines are asked for ahead, and on targets without masked stores, whose
+// head is led to a vector boundary.
+constexpr size_t kLongRow = 4096;
 
-// Asks for the input line 2 KiB ahead, and for the output line there with the right to write
-// it. An image that fits in L2 but not L1 then streams through faster than the hardware's own
-// prefetching brings it. Brighten of 640 x 480 pixels, over four relative alignments of input
-// and output, in times memcpy between the same buffers: 1.10-1.27 as it was; 1.05-1.13 asking
-// 1 KiB ahead; 1.04-1.13 asking 2 KiB ahead; 1.01-1.05 with that and two vectors read before
-// either is stored (the loop below). Reading an input off the output's alignment in joined
-// aligned vectors did worse (1.09-1.18) and is gone. Prefetches never fault, so lines past the
-// row's end cost only the read; the addresses are integers, never pointers out of range.
+// Asks for the input line 2 KiB ahead, and for the output line there to be written. An image
+// that fits in L2 but not L1 then streams through faster than the hardware's own prefetching
+// brings it. Brighten of 640 x 480 pixels, over four relative alignments of input and output, in
+// times memcpy between the same buffers: 1.10-1.27 as it was; 1.05-1.13 asking 1 KiB ahead;
+// 1.04-1.13 asking 2 KiB ahead; 1.01-1.05 with that and two vectors read before either is stored
+// (long_row_vectors below); with AVX2 on the same machine, 1.09-1.29 before and 1.02-1.10 after.
+// Reading an input off the output's alignment in joined aligned vectors did worse (1.09-1.18)
+// and is gone. Prefetches never fault, so lines past the row's end cost
+// only the read; the addresses are made from integers, never from pointers out of range.
 inline void prefetch_ahead(const uint8_t *in, const uint8_t *out) {
   constexpr uintptr_t kAhead = 2048;
   const uintptr_t read = reinterpret_cast<uintptr_t>(in) + kAhead;
   const uintptr_t write = reinterpret_cast<uintptr_t>(out) + kAhead;
+#if HWY_TARGET == HWY_AVX3
+  // Every processor with AVX-512 claims a line for writing with prefetchw.
   asm volatile("prefetcht0 (%0)\n\tprefetchw (%1)" : : "r"(read), "r"(write));
-}
+#else
+  __builtin_prefetch(reinterpret_cast<const void *>(read), 0, 3);
+  __builtin_prefetch(reinterpret_cast<const void *>(write), 1, 3);
 #endif
+}
+
+// The whole vectors of a long row from pixel i on, two at a time, each line asked for ahead;
+// returns the first pixel left.
+template <class Value>
+size_t long_row_vectors(const uint8_t *in, uint8_t *out, size_t i, size_t count,
+                        const Value &value) {
+  const D8 d;
+  const size_t lanes = hn::Lanes(d);
+  const LoadWhole whole;
+  constexpr size_t kLine = 64;
+  for (; count - i >= 2 * lanes; i += 2 * lanes) {
+    for (size_t line = 0; line < 2 * lanes; line += kLine) {
+      prefetch_ahead(in + i + line, out + i + line);
+    }
+    const auto first = value(d, i, whole);
+    const auto second = value(d, i + lanes, whole);
+    hn::StoreU(first, d, out + i);
+    hn::StoreU(second, d, out + i + lanes);
+  }
+  return i;
+}
 
 // Runs a row operation: value(d, i, load) is what the vector of pixels from i becomes,
 // keep(d, i, load) which of its lanes are written (EveryLane for all), both reading vectors with
@@ -158,19 +185,9 @@ void for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Value 
       store_vector(d, 0, out, lead, keep, whole, i);
     }
   }
-  // Only the operations that write every pixel run long rows; the keyed ones paste sprites. Two
-  // vectors are read before either is stored.
+  // Only the operations that write every pixel run long rows; the keyed ones paste sprites.
   if constexpr (std::is_same<Keep, EveryLane>::value) {
-    if (count >= kPrefetchFrom) {
-      for (; count - i >= 2 * lanes; i += 2 * lanes) {
-        prefetch_ahead(in + i, out + i);
-        prefetch_ahead(in + i + lanes, out + i + lanes);
-        const auto first = value(d, i, whole);
-        const auto second = value(d, i + lanes, whole);
-        store_vector(d, i, out, first, keep, whole);
-        store_vector(d, i + lanes, out, second, keep, whole);
-      }
-    }
+    if (count >= kLongRow) i = long_row_vectors(in, out, i, count, value);
   }
   for (; count - i >= lanes; i += lanes) store_vector(d, i, out, value(d, i, whole), keep, whole);
   if (i != count) {
@@ -179,17 +196,18 @@ void for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Value 
     store_vector(d, i, out, value(d, i, part), keep, part, count - i);
   }
 #else
-  (void)in;
   const hn::CappedTag<uint8_t, 16> d16;
   const size_t short_lanes = hn::Lanes(d16);
   // A short row, such as one of a pasted sprite, would spend more on the lead-in than it saves.
-  constexpr size_t kAlignFrom = 4096;
-  if (count >= kAlignFrom) {
+  if (count >= kLongRow) {
     i = bytes_to_boundary(out, short_lanes, count);
     plain(size_t{0}, i);
     const size_t lead = i + bytes_to_boundary(out + i, lanes, count - i);
     for (; lead - i >= short_lanes; i += short_lanes) {
       store_vector(d16, i, out, value(d16, i, whole), keep, whole);
+    }
+    if constexpr (std::is_same<Keep, EveryLane>::value) {
+      i = long_row_vectors(in, out, i, count, value);
     }
   }
   for (; count - i >= lanes; i += lanes) store_vector(d, i, out, value(d, i, whole), keep, whole);
