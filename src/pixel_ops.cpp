@@ -108,20 +108,40 @@ struct RowRule {
   kel::KeyedRowLoop keyed;
 };
 
-// Paste and blend differ only in their row loops: this machine's, and those that read each
-// source pixel just before writing its destination pixel, for a row whose destination starts
-// inside its source.
+// Paste and blend differ in their row loops: this machine's, and those that read each source
+// pixel just before writing its destination pixel, for a row whose destination starts inside its
+// source. A paste only writes its destination rows, and asks for the next one ahead.
 struct Compositing {
   RowRule fast, in_order;
+  bool writes_only;
 };
 
 Compositing paste_rules(const kel::CompositeRowLoops &loops) {
-  return {{loops.copy, loops.paste_with_key}, {copy_in_order, kel::plain::paste_row_with_key}};
+  return {
+      {loops.copy, loops.paste_with_key}, {copy_in_order, kel::plain::paste_row_with_key}, true};
 }
 
 Compositing blend_rules(const kel::CompositeRowLoops &loops) {
   return {{loops.blend, loops.blend_with_key},
-          {kel::plain::blend_row, kel::plain::blend_row_with_key}};
+          {kel::plain::blend_row, kel::plain::blend_row_with_key},
+          false};
+}
+
+// Asks for the lines of count bytes from `at` (an address, perhaps past the raster) to be
+// written. Destination rows lie a raster row apart, too far for the hardware's prefetching to
+// follow: asked for a row ahead, pasting a 400 x 300 sprite took 1.15-1.27 times a memcpy of it
+// instead of 1.36-1.49. A blend, which reads its destination too, went from 1.48-1.55 to
+// 1.60-1.78 and does not ask. Microcontrollers have no cache to fill ahead.
+void prefetch_for_writing(uintptr_t at, size_t count) {
+#if KEL_USE_HIGHWAY
+  constexpr uintptr_t kLine = 64;
+  for (uintptr_t line = at & ~(kLine - 1); line < at + count; line += kLine) {
+    __builtin_prefetch(reinterpret_cast<const void *>(line), 1, 3);
+  }
+#else
+  (void)at;
+  (void)count;
+#endif
 }
 
 // The keyed row, in one call of the keyed loop or, where the loops are plain ones, in pieces:
@@ -163,6 +183,10 @@ void composite(const Compositing &rules, uint8_t *dst, int32_t dst_height, int32
     // Both offsets lie inside their rasters, which the caller sized, so they fit ptrdiff_t.
     const uint8_t *from = src + static_cast<ptrdiff_t>(row * src_width + rect.first_col);
     uint8_t *to = dst + static_cast<ptrdiff_t>((y + row) * dst_width + x + rect.first_col);
+    if (rules.writes_only) {
+      prefetch_for_writing(reinterpret_cast<uintptr_t>(to) + static_cast<uintptr_t>(dst_width),
+                           count);
+    }
     const bool overlapping = starts_inside(to, from, count);
     const RowRule &rule = overlapping ? rules.in_order : rules.fast;
     if (key > 255) {
