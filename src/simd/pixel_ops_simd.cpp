@@ -115,8 +115,8 @@ constexpr size_t kLongRow = 4096;
 // 1.04-1.13 asking 2 KiB ahead; 1.01-1.05 with that and two vectors read before either is stored
 // (long_row_vectors below); with AVX2 on the same machine, 1.09-1.29 before and 1.02-1.10 after.
 // Reading an input off the output's alignment in joined aligned vectors did worse (1.09-1.18)
-// and is gone. Prefetches never fault, so lines past the row's end cost
-// only the read; the addresses are made from integers, never from pointers out of range.
+// and is gone. Prefetches never fault, so lines past the row's end cost only the read; the
+// addresses are made from integers, never from pointers out of range.
 inline void prefetch_ahead(const uint8_t *in, const uint8_t *out) {
   constexpr uintptr_t kAhead = 2048;
   const uintptr_t read = reinterpret_cast<uintptr_t>(in) + kAhead;
