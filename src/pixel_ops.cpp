@@ -474,66 +474,97 @@ void dilate_until_full(uint8_t *grid, uint16_t grid_height, uint16_t grid_width,
   }
 }
 
-// a * b bytes, or null when the product does not fit size_t or malloc fails. A zero-byte
-// buffer is asked for as one byte, so that a null can only mean failure.
-uint8_t *allocate_bytes(size_t a, size_t b) {
-  if (b != 0 && a > SIZE_MAX / b) return nullptr;
-  const size_t bytes = a * b;
-  return static_cast<uint8_t *>(std::malloc(bytes != 0 ? bytes : 1));
-}
-
-// The four scratch buffers of one fill, taken in this order and released together, as hosts that
-// count or fail allocations expect. The sweeps need no second grid, so `next` stays unused.
-struct FillScratch {
-  uint8_t *enlarged = nullptr;
-  uint8_t *current = nullptr;
-  uint8_t *next = nullptr;
-  uint8_t *blurred = nullptr;
-
-  bool allocate(uint16_t height, uint16_t width, uint16_t grid_height, uint16_t grid_width,
-                uint16_t big_height, uint16_t big_width) {
-    enlarged = allocate_bytes(big_height, big_width);
-    if (enlarged != nullptr) current = allocate_bytes(grid_height, grid_width);
-    if (current != nullptr) next = allocate_bytes(grid_height, grid_width);
-    if (next != nullptr) blurred = allocate_bytes(height, width);
-    return blurred != nullptr;
-  }
-  ~FillScratch() {
-    std::free(enlarged);
-    std::free(current);
-    std::free(next);
-    std::free(blurred);
-  }
+// The sides of one fill: the source, its grid of 8 x 8 cells and the enlarged grid.
+struct FillSizes {
+  uint16_t height, width, grid_height, grid_width, big_height, big_width;
+  size_t pixels() const { return size_t{height} * width; }
+  size_t cells() const { return size_t{grid_height} * grid_width; }
+  size_t big_pixels() const { return size_t{big_height} * big_width; }
 };
 
-void fill_masked(const uint8_t *src, uint16_t height, uint16_t width, const uint8_t *mask,
-                 uint8_t *dst) {
+FillSizes fill_sizes(uint16_t height, uint16_t width) {
   const uint16_t grid_height = cells_for(height);
   const uint16_t grid_width = cells_for(width);
-  const uint16_t big_height = static_cast<uint16_t>(grid_height * kBlockSide);
-  const uint16_t big_width = static_cast<uint16_t>(grid_width * kBlockSide);
-  const size_t pixels = size_t{height} * width;
+  return {height,
+          width,
+          grid_height,
+          grid_width,
+          static_cast<uint16_t>(grid_height * kBlockSide),
+          static_cast<uint16_t>(grid_width * kBlockSide)};
+}
 
+// The four scratch buffers of one fill. The sweeps need no second grid, so `next` stays unused;
+// it is kept so that hosts that count or fail allocations see the four they always saw. The
+// enlarged raster, 64 bytes per cell, holds the sweeps' 32-bit keys until the enlargement writes
+// it, so it comes first and aligned as for uint32_t.
+struct FillScratch {
+  uint8_t *enlarged, *current, *next, *blurred;
+};
+
+// Sum of the four buffers' sizes, or 0 when it does not fit size_t (the sides are at most 65528,
+// so that happens only where size_t has 32 bits). Slack for aligning the block is included.
+size_t scratch_bytes_for(const FillSizes &s) {
+  const size_t parts[] = {s.big_pixels(), s.cells(), s.cells(), s.pixels(), alignof(uint32_t) - 1};
+  size_t total = 0;
+  for (const size_t part : parts) {
+    if (part > SIZE_MAX - total) return 0;
+    total += part;
+  }
+  return total;
+}
+
+// The four buffers carved out of one block, the first aligned for the keys.
+FillScratch carve(const FillSizes &s, void *block) {
+  const uintptr_t at = reinterpret_cast<uintptr_t>(block);
+  const uintptr_t misalignment = at % alignof(uint32_t);
+  uint8_t *start =
+      static_cast<uint8_t *>(block) + (misalignment != 0 ? alignof(uint32_t) - misalignment : 0);
   FillScratch scratch;
-  if (!scratch.allocate(height, width, grid_height, grid_width, big_height, big_width)) return;
+  scratch.enlarged = start;
+  scratch.current = scratch.enlarged + s.big_pixels();
+  scratch.next = scratch.current + s.cells();
+  scratch.blurred = scratch.next + s.cells();
+  return scratch;
+}
 
-  if (dst != src && pixels != 0) std::memcpy(dst, src, pixels);
-  std::memset(scratch.current, 0, size_t{grid_height} * grid_width);
-  const FillRasters fill{src, mask, height, width, scratch.current, grid_width, scratch.blurred,
+void fill_masked(const uint8_t *src, const FillSizes &s, const uint8_t *mask, uint8_t *dst,
+                 const FillScratch &scratch) {
+  const uint16_t height = s.height, width = s.width;
+  if (dst != src && s.pixels() != 0) std::memcpy(dst, src, s.pixels());
+  std::memset(scratch.current, 0, s.cells());
+  const FillRasters fill{src, mask, height, width, scratch.current, s.grid_width, scratch.blurred,
                          dst};
   for_each_window_piece(Extreme::kSmallest, fill, gather_edge_values);
-  // The enlarged raster, 64 bytes per cell, is not needed until the enlargement writes it: it
-  // holds the sweeps' keys meanwhile.
-  dilate_until_full(scratch.current, grid_height, grid_width,
+  dilate_until_full(scratch.current, s.grid_height, s.grid_width,
                     reinterpret_cast<uint32_t *>(scratch.enlarged));
 
-  kel_blur_uint8(scratch.current, grid_height, grid_width, scratch.current);
-  kel_scale_up_bilinear_uint8(scratch.current, grid_height, grid_width, kBlockSide,
-                              scratch.enlarged, big_height, big_width);
+  kel_blur_uint8(scratch.current, s.grid_height, s.grid_width, scratch.current);
+  kel_scale_up_bilinear_uint8(scratch.current, s.grid_height, s.grid_width, kBlockSide,
+                              scratch.enlarged, s.big_height, s.big_width);
 
-  fill_holes(mask, height, width, scratch.enlarged, big_width, dst);
+  fill_holes(mask, height, width, scratch.enlarged, s.big_width, dst);
   kel_blur_uint8(dst, height, width, scratch.blurred);
   for_each_window_piece(Extreme::kLargest, fill, soften_seam);
+}
+
+// n bytes from malloc; a zero-byte buffer is asked for as one byte, so that a null can only mean
+// failure.
+uint8_t *allocate_bytes(size_t n) {
+  return static_cast<uint8_t *>(std::malloc(n != 0 ? n : 1));
+}
+
+// The heap-using fill: the four buffers taken in order, each only if the one before was had, and
+// released together. Each size is a product of two 16-bit sides, so it fits size_t.
+void fill_from_heap(const uint8_t *src, const FillSizes &s, const uint8_t *mask, uint8_t *dst) {
+  FillScratch scratch{allocate_bytes(s.big_pixels()), nullptr, nullptr, nullptr};
+  if (scratch.enlarged != nullptr) scratch.current = allocate_bytes(s.cells());
+  if (scratch.current != nullptr) scratch.next = allocate_bytes(s.cells());
+  if (scratch.next != nullptr) scratch.blurred = allocate_bytes(s.pixels());
+  if (scratch.blurred != nullptr) fill_masked(src, s, mask, dst, scratch);
+  std::free(scratch.enlarged);
+  std::free(scratch.current);
+  std::free(scratch.next);
+  std::free(scratch.blurred);
 }
 
 }  // namespace
@@ -636,7 +667,20 @@ void kel_image_blend_image(uint8_t *dst, int32_t dst_height, int32_t dst_width, 
 void kel_mask_image(const uint8_t *src, uint16_t height, uint16_t width, const uint8_t *mask,
                     uint8_t *dst) {
   if (height > kMaxFillSide || width > kMaxFillSide) return;
-  fill_masked(src, height, width, mask, dst);
+  fill_from_heap(src, fill_sizes(height, width), mask, dst);
+}
+
+size_t kel_mask_image_scratch_size(uint16_t height, uint16_t width) {
+  if (height > kMaxFillSide || width > kMaxFillSide) return 0;
+  return scratch_bytes_for(fill_sizes(height, width));
+}
+
+void kel_mask_image_into(const uint8_t *src, uint16_t height, uint16_t width, const uint8_t *mask,
+                         uint8_t *dst, void *scratch, size_t scratch_bytes) {
+  const size_t needed = kel_mask_image_scratch_size(height, width);
+  if (needed == 0 || scratch == nullptr || scratch_bytes < needed) return;
+  const FillSizes sizes = fill_sizes(height, width);
+  fill_masked(src, sizes, mask, dst, carve(sizes, scratch));
 }
 
 }  // extern "C"

@@ -185,43 +185,6 @@ struct SignedNearest {
 #endif
 };
 
-// The canvas, every pixel set to the fill; null when malloc fails.
-void *allocate_canvas(size_t bytes, uint8_t fill) {
-  // Taken back through a volatile so that no compiler merges this malloc and a fill of 0 into
-  // calloc: the header promises malloc, and hosts that count on it may provide no calloc.
-  void *volatile fresh = std::malloc(bytes);
-  void *block = fresh;
-  if (block != nullptr) std::memset(block, fill, bytes);
-  return block;
-}
-
-// A new canvas for the turn by angle, its geometry and the opposite turn that maps it back.
-struct Canvas {
-  void *pixels;
-  CanvasGeometry geometry;
-  Turn opposite;
-};
-
-// Canvas geometry, allocation and fill. The four sizes and offsets are written before any pixel is
-// resampled; when no canvas can be made they are 0 and the opposite turn is not asked for.
-Canvas new_canvas(int64_t height, int64_t width, uint8_t angle, uint8_t fill,
-                  int32_t *canvas_height, int32_t *canvas_width, int32_t *offset_y,
-                  int32_t *offset_x) {
-  Canvas c{nullptr, turned_canvas(height, width, turn_by(angle)), {0, 0}};
-  const CanvasGeometry &g = c.geometry;
-  if (!representable(g)) {
-    *canvas_height = *canvas_width = *offset_y = *offset_x = 0;
-    return c;
-  }
-  c.pixels = allocate_canvas(static_cast<size_t>(g.height) * static_cast<size_t>(g.width), fill);
-  *canvas_height = static_cast<int32_t>(g.height);
-  *canvas_width = static_cast<int32_t>(g.width);
-  *offset_y = static_cast<int32_t>(g.offset_y);
-  *offset_x = static_cast<int32_t>(g.offset_x);
-  if (c.pixels != nullptr) c.opposite = turn_by(static_cast<uint8_t>(-angle & 255));
-  return c;
-}
-
 // The columns [first, last) of canvas row r whose position, mapped back through the opposite
 // turn b, has a whole part in [0, side - reach) on both axes, and the position of column first.
 // The position is linear along a row, so they form one run, stepped through by (cos, sin).
@@ -284,22 +247,81 @@ void resample_canvas(const Source<typename Policy::Pixel> &src, const CanvasGeom
   }
 }
 
+// The canvas geometry that a turn by angle asks for, and its byte count; 0 bytes when its sides do
+// not fit int32_t or its byte count does not fit size_t (sides are never below 1).
+size_t canvas_for(int64_t height, int64_t width, uint8_t angle, kel_canvas &canvas) {
+  const CanvasGeometry g = turned_canvas(height, width, turn_by(angle));
+  if (!representable(g)) {
+    canvas = kel_canvas{0, 0, 0, 0};
+    return 0;
+  }
+  canvas = kel_canvas{static_cast<int32_t>(g.height), static_cast<int32_t>(g.width),
+                      static_cast<int32_t>(g.offset_y), static_cast<int32_t>(g.offset_x)};
+  return static_cast<size_t>(g.height) * static_cast<size_t>(g.width);
+}
+
+// Fills and resamples a canvas the caller holds. Any geometry is safe: positions are worked in
+// 64 bits and only those inside the source are read; a buffer smaller than the geometry's sides
+// (or no geometry) leaves everything untouched and asks the math library for nothing.
+template <typename Policy>
+void rotate_into(const typename Policy::Pixel *pixels, int64_t height, int64_t width, uint8_t angle,
+                 const kel_canvas *canvas, typename Policy::Pixel *out, size_t capacity) {
+  if (canvas == nullptr || out == nullptr || canvas->height <= 0 || canvas->width <= 0) return;
+  const CanvasGeometry g{canvas->height, canvas->width, canvas->offset_y, canvas->offset_x};
+  if (static_cast<uint64_t>(g.height) * static_cast<uint64_t>(g.width) > capacity) return;
+  std::memset(out, static_cast<uint8_t>(Policy::kFill),
+              static_cast<size_t>(g.height) * static_cast<size_t>(g.width));
+  const Turn opposite = turn_by(static_cast<uint8_t>(-angle & 255));
+  resample_canvas<Policy>(Source<typename Policy::Pixel>{pixels, height, width}, g, opposite, out);
+}
+
+// The heap-using rotation: the geometry, a canvas from malloc, then the rotation into it. The
+// four sizes and offsets are written before any pixel is resampled; when no canvas can be made
+// they are 0 and the opposite turn is not asked for.
 template <typename Policy>
 void rotate(const typename Policy::Pixel *pixels, int64_t height, int64_t width, uint8_t angle,
             typename Policy::Pixel **canvas, int32_t *canvas_height, int32_t *canvas_width,
             int32_t *offset_y, int32_t *offset_x) {
   using Pixel = typename Policy::Pixel;
-  const Canvas c = new_canvas(height, width, angle, static_cast<uint8_t>(Policy::kFill),
-                              canvas_height, canvas_width, offset_y, offset_x);
-  *canvas = static_cast<Pixel *>(c.pixels);
-  if (c.pixels == nullptr) return;
-  resample_canvas<Policy>(Source<Pixel>{pixels, height, width}, c.geometry, c.opposite,
-                          static_cast<Pixel *>(c.pixels));
+  kel_canvas geometry;
+  const size_t bytes = canvas_for(height, width, angle, geometry);
+  *canvas_height = geometry.height;
+  *canvas_width = geometry.width;
+  *offset_y = geometry.offset_y;
+  *offset_x = geometry.offset_x;
+  *canvas = nullptr;
+  if (bytes == 0) return;
+  // Taken back through a volatile so that no compiler merges this malloc and the fill into
+  // calloc: the header promises malloc, and hosts that count on it may provide no calloc.
+  void *volatile fresh = std::malloc(bytes);
+  auto *block = static_cast<Pixel *>(fresh);
+  *canvas = block;
+  if (block != nullptr) rotate_into<Policy>(pixels, height, width, angle, &geometry, block, bytes);
 }
 
 }  // namespace
 
 extern "C" {
+
+size_t kel_rotation_canvas(int64_t height, int64_t width, uint8_t angle, kel_canvas *canvas) {
+  kel_canvas ignored;
+  return canvas_for(height, width, angle, canvas != nullptr ? *canvas : ignored);
+}
+
+void kel_image_rotate_into(const uint8_t *src, uint32_t height, uint32_t width, uint8_t angle,
+                           const kel_canvas *canvas, uint8_t *pixels, size_t capacity) {
+  rotate_into<UnsignedBilinear>(src, height, width, angle, canvas, pixels, capacity);
+}
+
+void kel_image_rotate_int8_into(const int8_t *src, uint32_t height, uint32_t width, uint8_t angle,
+                                const kel_canvas *canvas, int8_t *pixels, size_t capacity) {
+  rotate_into<SignedBilinear>(src, height, width, angle, canvas, pixels, capacity);
+}
+
+void kel_image_rotate_int8_nn_into(const int8_t *src, int32_t height, int32_t width, uint8_t angle,
+                                   const kel_canvas *canvas, int8_t *pixels, size_t capacity) {
+  rotate_into<SignedNearest>(src, height, width, angle, canvas, pixels, capacity);
+}
 
 void kel_image_rotate(const uint8_t *src, uint32_t height, uint32_t width, uint8_t angle,
                       uint8_t **canvas, int32_t *canvas_height, int32_t *canvas_width,
