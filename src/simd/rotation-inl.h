@@ -1,16 +1,20 @@
-// Vector variants of the rotations' inner loop: one run of canvas pixels along a row, every one
-// of which maps inside the source. Compiled once per instruction set and picked at run time; the
-// plain loop in rotation.cpp is the reference they are tested against, bit for bit.
+// Vector variants of the rotations' runs: consecutive canvas pixels of a row, every one of
+// which maps inside the source. Compiled once per instruction set through
+// simd/kernels_simd.cpp; each does whole vectors and returns how many pixels it did.
 //
-// Lanes are 32-bit. The caller takes this path only for sources below 2^16 on each side and
-// below 2^31 pixels, so every position inside the source (below 2^16 * 16384 = 2^30), every
-// step between them and every byte offset fits a lane exactly.
-#undef HWY_TARGET_INCLUDE
-#define HWY_TARGET_INCLUDE "simd/rotation_simd.cpp"
-#include "simd/rotation_simd.h"
+// Lanes are 32-bit. The variants take only sources below 2^16 on each side and below 2^31
+// pixels, so every position inside the source (below 2^16 * 16384 = 2^30), every step between
+// them and every byte offset fits a lane exactly; they leave other runs to the plain body.
+#if defined(KEL_SIMD_ROTATION_INL_H_) == defined(HWY_TARGET_TOGGLE)
+#ifdef KEL_SIMD_ROTATION_INL_H_
+#undef KEL_SIMD_ROTATION_INL_H_
+#else
+#define KEL_SIMD_ROTATION_INL_H_
+#endif
 
-#include <hwy/foreach_target.h>  // must come before highway.h
 #include <hwy/highway.h>
+
+#include "kernels.h"
 
 HWY_BEFORE_NAMESPACE();
 namespace kel {
@@ -28,7 +32,33 @@ struct Positions {
   V32 x, y;
 };
 
-Positions first_positions(D32 d, const RotationRow &row) {
+// The run in 32-bit lanes, as the variants read it.
+struct LaneRun {
+  const void *src;
+  int32_t height, width;
+  int32_t x, y, step_x, step_y;
+  size_t count;
+};
+
+// Whether the run's source keeps every position and offset inside a 32-bit lane, and has at
+// least `least_pixels` pixels.
+bool fits_lanes(const RotationRun &run, int64_t least_pixels) {
+  return run.width < (1 << 16) && run.height < (1 << 16) &&
+         run.width * run.height < (int64_t{1} << 31) && run.width * run.height >= least_pixels;
+}
+
+LaneRun lanes_of(const RotationRun &run) {
+  return {run.src,
+          static_cast<int32_t>(run.height),
+          static_cast<int32_t>(run.width),
+          static_cast<int32_t>(run.x),
+          static_cast<int32_t>(run.y),
+          run.step_x,
+          run.step_y,
+          run.count};
+}
+
+Positions first_positions(D32 d, const LaneRun &row) {
   const V32 lane = hn::Iota(d, 0);
   return {hn::Add(hn::Set(d, row.x), hn::Mul(lane, hn::Set(d, row.step_x))),
           hn::Add(hn::Set(d, row.y), hn::Mul(lane, hn::Set(d, row.step_y)))};
@@ -145,7 +175,7 @@ V32 bilinear_pixels(D32 d, const NeighbourPairs &pixels, V32 fx, V32 fy) {
 
 template <typename Pixel>
 void store_pixels(V32 values, Pixel *out) {
-#if HWY_TARGET == HWY_AVX3
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
   // Every value fits its pixel, so keeping each lane's low byte is exact: one instruction where
   // the saturating demotion packs twice and permutes.
   _mm_storeu_si128(reinterpret_cast<__m128i *>(out), _mm512_cvtepi32_epi8(values.raw));
@@ -156,7 +186,7 @@ void store_pixels(V32 values, Pixel *out) {
 }
 
 template <bool kSigned, typename Pixel>
-size_t bilinear_row(const RotationRow &row, Pixel *out) {
+size_t bilinear_row(const LaneRun &row, Pixel *out) {
   const D32 d;
   const size_t lanes = hn::Lanes(d);
   const auto *src = static_cast<const uint8_t *>(row.src);
@@ -187,18 +217,18 @@ size_t bilinear_row(const RotationRow &row, Pixel *out) {
   return done;
 }
 
-size_t BilinearRowU8(const RotationRow &row, uint8_t *out) {
-  return bilinear_row<false>(row, out);
+size_t BilinearRowU8(const RotationRun &run, uint8_t *out) {
+  return fits_lanes(run, 1) ? bilinear_row<false>(lanes_of(run), out) : 0;
 }
 
-size_t BilinearRowI8(const RotationRow &row, int8_t *out) {
-  return bilinear_row<true>(row, out);
+size_t BilinearRowI8(const RotationRun &run, int8_t *out) {
+  return fits_lanes(run, 1) ? bilinear_row<true>(lanes_of(run), out) : 0;
 }
 
 // One 4-byte read per lane holds the pixel: at its own offset where the source has three more
-// bytes after it, else ending at it (the last pixels of the source). The caller takes this path
-// only for sources of four pixels or more, so both reads stay inside.
-size_t NearestRowI8(const RotationRow &row, int8_t *out) {
+// bytes after it, else ending at it (the last pixels of the source). Only sources of four pixels
+// or more are taken, so both reads stay inside.
+size_t nearest_row(const LaneRun &row, int8_t *out) {
   const D32 d;
   const size_t lanes = hn::Lanes(d);
   const auto *words = static_cast<const int32_t *>(row.src);
@@ -224,31 +254,13 @@ size_t NearestRowI8(const RotationRow &row, int8_t *out) {
   return done;
 }
 
+size_t NearestRowI8(const RotationRun &run, int8_t *out) {
+  return fits_lanes(run, 4) ? nearest_row(lanes_of(run), out) : 0;
+}
+
 }  // namespace HWY_NAMESPACE
 }  // namespace simd
 }  // namespace kel
 HWY_AFTER_NAMESPACE();
 
-#if HWY_ONCE
-namespace kel {
-namespace simd {
-
-HWY_EXPORT(BilinearRowU8);
-HWY_EXPORT(BilinearRowI8);
-HWY_EXPORT(NearestRowI8);
-
-size_t rotate_row_bilinear(const RotationRow &row, uint8_t *out) {
-  return HWY_DYNAMIC_DISPATCH(BilinearRowU8)(row, out);
-}
-
-size_t rotate_row_bilinear(const RotationRow &row, int8_t *out) {
-  return HWY_DYNAMIC_DISPATCH(BilinearRowI8)(row, out);
-}
-
-size_t rotate_row_nearest(const RotationRow &row, int8_t *out) {
-  return HWY_DYNAMIC_DISPATCH(NearestRowI8)(row, out);
-}
-
-}  // namespace simd
-}  // namespace kel
-#endif  // HWY_ONCE
+#endif  // KEL_SIMD_ROTATION_INL_H_
