@@ -12,6 +12,7 @@
 #include <cstdint>
 #include <cstdlib>
 #include <limits>
+#include <memory>
 #include <string>
 #include <type_traits>
 #include <utility>
@@ -273,43 +274,33 @@ py::tuple std_dev(ArrayArgument img, FlagArgument exact) {
   return image_statistic(img, exact, kel_image_std, true);
 }
 
-// The canvas and the corner's place on it, the canvas handed to numpy with free as its release.
-struct Rotated {
-  void *canvas = nullptr;
-  int32_t height = 0, width = 0, offset_y = 0, offset_x = 0;
-};
-
-template <typename Pixel>
-py::tuple canvas_result(const Rotated &rotated) {
-  if (rotated.canvas == nullptr) {
-    PyErr_SetString(PyExc_MemoryError, "no memory for the rotated canvas");
-    throw py::error_already_set();
+// The rotations write into a numpy array of the canvas's size, which owns its memory like any
+// other: no copy, no capsule, and numpy's allocator (a MemoryError when it fails).
+template <typename Pixel, typename Side, typename Rotation>
+py::tuple rotate_into(Rotation rotation, const Picture<const Pixel> &source, uint8_t angle) {
+  auto [height, width] = sides<Side>(source, "img");
+  kel_canvas canvas;
+  const size_t bytes = kel_rotation_canvas(source.height, source.width, angle, &canvas);
+  if (bytes == 0) {
+    value_error("img of " + std::to_string(source.height) + " x " + std::to_string(source.width) +
+                " turns onto a canvas too large to make");
   }
-  py::capsule owner(rotated.canvas, [](void *block) { std::free(block); });
-  py::array_t<Pixel> canvas({int64_t{rotated.height}, int64_t{rotated.width}},
-                            static_cast<Pixel *>(rotated.canvas), owner);
-  return py::make_tuple(canvas, py::make_tuple(rotated.offset_y, rotated.offset_x));
+  auto result = new_picture<Pixel>(canvas.height, canvas.width);
+  Pixel *pixels = result.mutable_data();
+  {
+    py::gil_scoped_release unlocked;
+    rotation(source.pixels, height, width, angle, &canvas, pixels, bytes);
+  }
+  return py::make_tuple(result, py::make_tuple(canvas.offset_y, canvas.offset_x));
 }
 
 py::tuple rotate(ArrayArgument img, IntegerArgument angle_value, FlagArgument nearest_value) {
   const uint8_t angle = narrow<uint8_t>(angle_value, "angle");
   const bool nearest = flag(nearest_value, "nearest");
-  Rotated out;
   if (py::isinstance<py::array_t<int8_t>>(img)) {
     auto source = picture<const int8_t>(img, "img");
-    auto **canvas = reinterpret_cast<int8_t **>(&out.canvas);
-    if (nearest) {
-      auto [height, width] = sides<int32_t>(source, "img");
-      py::gil_scoped_release unlocked;
-      kel_image_rotate_int8_nn(source.pixels, height, width, angle, canvas, &out.height, &out.width,
-                               &out.offset_y, &out.offset_x);
-    } else {
-      auto [height, width] = sides<uint32_t>(source, "img");
-      py::gil_scoped_release unlocked;
-      kel_image_rotate_int8(source.pixels, height, width, angle, canvas, &out.height, &out.width,
-                            &out.offset_y, &out.offset_x);
-    }
-    return canvas_result<int8_t>(out);
+    if (nearest) return rotate_into<int8_t, int32_t>(kel_image_rotate_int8_nn_into, source, angle);
+    return rotate_into<int8_t, uint32_t>(kel_image_rotate_int8_into, source, angle);
   }
   if (py::isinstance<py::array>(img) && !py::isinstance<py::array_t<uint8_t>>(img)) {
     type_error("img must have dtype uint8 or int8, not " +
@@ -317,13 +308,7 @@ py::tuple rotate(ArrayArgument img, IntegerArgument angle_value, FlagArgument ne
   }
   auto source = picture<const uint8_t>(img, "img");
   if (nearest) value_error("nearest=True rotates int8 pictures only");
-  auto [height, width] = sides<uint32_t>(source, "img");
-  {
-    py::gil_scoped_release unlocked;
-    kel_image_rotate(source.pixels, height, width, angle, reinterpret_cast<uint8_t **>(&out.canvas),
-                     &out.height, &out.width, &out.offset_y, &out.offset_x);
-  }
-  return canvas_result<uint8_t>(out);
+  return rotate_into<uint8_t, uint32_t>(kel_image_rotate_into, source, angle);
 }
 
 // brighten, darken and get_mask: a new picture from the old, given one number of the routine's
@@ -370,14 +355,18 @@ py::array_t<uint8_t> mask_image(ArrayArgument img, ArrayArgument mask) {
   if (source.height > kMaxFillSide || source.width > kMaxFillSide) {
     value_error("mask_image takes sides up to " + std::to_string(kMaxFillSide));
   }
-  // The fill works in place on a copy, so that a fill that finds no memory returns the picture
-  // unchanged rather than an uninitialised one.
-  py::array_t<uint8_t> result = py::array_t<uint8_t>(source.array.attr("copy")());
-  uint8_t *out = result.mutable_data();
   const auto height = static_cast<uint16_t>(source.height);
   const auto width = static_cast<uint16_t>(source.width);
+  // The module takes the scratch itself, so that no memory for it is a MemoryError (pybind11's
+  // answer to std::bad_alloc) rather than a picture the library left unwritten.
+  const size_t scratch_bytes = kel_mask_image_scratch_size(height, width);
+  if (scratch_bytes == 0) value_error("mask_image's scratch would not fit size_t");
+  const std::unique_ptr<uint8_t[]> scratch(new uint8_t[scratch_bytes]);
+  auto result = new_picture<uint8_t>(source.height, source.width);
+  uint8_t *out = result.mutable_data();
   py::gil_scoped_release unlocked;
-  kel_mask_image(out, height, width, holes.pixels, out);
+  kel_mask_image_into(source.pixels, height, width, holes.pixels, out, scratch.get(),
+                      scratch_bytes);
   return result;
 }
 

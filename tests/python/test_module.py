@@ -1,5 +1,8 @@
 """The module against the library's known answers, and every bad argument it must refuse."""
 
+import subprocess
+import sys
+import textwrap
 import zlib
 from decimal import Decimal
 from fractions import Fraction
@@ -208,3 +211,21 @@ def test_wrapped_figures_are_the_librarys_and_documented():
     assert "16384" in k.hist_std.__doc__
     hist = k.histogram(np.full((1, 4), 255, U8))
     assert k.hist_std(hist, 0, 4) == int(np.sqrt(k.hist_var(hist, 0, 4) % 16384))
+
+
+def test_no_memory_for_the_fill_is_a_memory_error():
+    # Room for the picture's result but not for the fill's scratch, which is twice the picture.
+    code = textwrap.dedent("""
+        import resource, numpy as np, kel_images as k
+        img = np.full((4000, 4000), 9, np.uint8)
+        mask = np.ones_like(img)
+        mask[9:99, 9:99] = 0
+        used = int(open("/proc/self/statm").read().split()[0]) * resource.getpagesize()
+        resource.setrlimit(resource.RLIMIT_AS, (used + 24 * 2**20, resource.RLIM_INFINITY))
+        try:
+            k.mask_image(img, mask)
+        except MemoryError:
+            print("MemoryError")
+    """)
+    run = subprocess.run([sys.executable, "-c", code], capture_output=True, text=True, check=True)
+    assert run.stdout == "MemoryError\n"

@@ -5,6 +5,7 @@
 #include <cstdlib>
 #include <memory>
 #include <new>
+#include <type_traits>
 
 #include "figures.h"
 #include "kel_images.h"
@@ -31,25 +32,27 @@ uint8_t to_unsigned(int8_t value) {
   return static_cast<uint8_t>(value + 128);
 }
 
-struct CanvasFree {
-  void operator()(void *canvas) const { std::free(canvas); }
-};
-
-// Calls one of the three rotations, which differ only in their pixel type, and takes over the
-// canvas it hands back.
+// Calls one of the three rotations, which differ only in their pixel type, into a canvas of the
+// size that kel_rotation_canvas gives: an unsigned picture's canvas is the result itself, a signed
+// one is turned back into unsigned values.
 template <typename Pixel, typename Size, typename Rotation>
-Rotated run_rotation(Rotation rotation, const Pixel *source, const Picture &picture, uint8_t angle,
-                     uint8_t (*to_picture)(Pixel)) {
-  Pixel *raw = nullptr;
+Rotated run_rotation(Rotation rotate_into, const Pixel *source, const Picture &picture,
+                     uint8_t angle, uint8_t (*to_picture)(Pixel)) {
+  kel_canvas canvas;
+  const size_t bytes = kel_rotation_canvas(picture.height, picture.width, angle, &canvas);
+  if (bytes == 0) throw std::bad_alloc();  // no canvas of that size can exist here
   Rotated rotated;
-  int32_t canvas_height = 0, canvas_width = 0;
-  rotation(source, static_cast<Size>(picture.height), static_cast<Size>(picture.width), angle, &raw,
-           &canvas_height, &canvas_width, &rotated.offset_y, &rotated.offset_x);
-  const std::unique_ptr<Pixel, CanvasFree> canvas(raw);
-  if (!canvas) throw std::bad_alloc();
-  rotated.canvas = Picture(canvas_width, canvas_height, 0);
-  std::transform(canvas.get(), canvas.get() + rotated.canvas.pixels.size(),
-                 rotated.canvas.pixels.begin(), to_picture);
+  rotated.offset_x = canvas.offset_x;
+  rotated.offset_y = canvas.offset_y;
+  rotated.canvas = Picture(canvas.width, canvas.height, 0);
+  const auto height = static_cast<Size>(picture.height), width = static_cast<Size>(picture.width);
+  if constexpr (std::is_same_v<Pixel, uint8_t>) {
+    rotate_into(source, height, width, angle, &canvas, rotated.canvas.data(), bytes);
+  } else {
+    std::vector<Pixel> pixels(bytes);
+    rotate_into(source, height, width, angle, &canvas, pixels.data(), bytes);
+    std::transform(pixels.begin(), pixels.end(), rotated.canvas.pixels.begin(), to_picture);
+  }
   return rotated;
 }
 
@@ -127,15 +130,16 @@ Rotated rotate(const Picture &picture, uint8_t angle, Resampling resampling) {
                      "below 16384");
   }
   if (resampling == Resampling::bilinear) {
-    return run_rotation<uint8_t, uint32_t>(kel_image_rotate, picture.data(), picture, angle, same);
+    return run_rotation<uint8_t, uint32_t>(kel_image_rotate_into, picture.data(), picture, angle,
+                                           same);
   }
   std::vector<int8_t> source(picture.pixels.size());
   std::transform(picture.pixels.begin(), picture.pixels.end(), source.begin(), to_signed);
   if (resampling == Resampling::bilinear_int8) {
-    return run_rotation<int8_t, uint32_t>(kel_image_rotate_int8, source.data(), picture, angle,
+    return run_rotation<int8_t, uint32_t>(kel_image_rotate_int8_into, source.data(), picture, angle,
                                           to_unsigned);
   }
-  return run_rotation<int8_t, int32_t>(kel_image_rotate_int8_nn, source.data(), picture, angle,
+  return run_rotation<int8_t, int32_t>(kel_image_rotate_int8_nn_into, source.data(), picture, angle,
                                        to_unsigned);
 }
 
@@ -174,9 +178,16 @@ Picture fill(const Picture &picture, const Picture &hole_mask) {
     throw InputError("the mask is " + size_text(hole_mask) + " pixels, the picture " +
                      size_text(picture) + "; they must be the same size");
   }
+  const auto height = static_cast<uint16_t>(picture.height);
+  const auto width = static_cast<uint16_t>(picture.width);
+  // The scratch is taken here rather than by kel_mask_image, so that no memory for it is an error
+  // to report (exit 2, nothing written) rather than a picture the library left unwritten.
+  const size_t scratch_bytes = kel_mask_image_scratch_size(height, width);
+  if (scratch_bytes == 0) throw std::bad_alloc();  // more than size_t holds
+  const std::unique_ptr<uint8_t[]> scratch(new uint8_t[scratch_bytes]);
   Picture result(picture.width, picture.height, 0);
-  kel_mask_image(picture.data(), static_cast<uint16_t>(picture.height),
-                 static_cast<uint16_t>(picture.width), hole_mask.data(), result.data());
+  kel_mask_image_into(picture.data(), height, width, hole_mask.data(), result.data(), scratch.get(),
+                      scratch_bytes);
   return result;
 }
 
