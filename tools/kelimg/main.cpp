@@ -533,6 +533,8 @@ int main(int argc, char **argv) {
   // A reader that goes away (kelimg convert a.png - | head -c 0) is a write error to report,
   // not a signal that ends the tool without a word.
   std::signal(SIGPIPE, SIG_IGN);
+  // Before any other thread starts: they inherit the blocked signals.
+  kelimg::remove_temporaries_on_signals();
   CLI::App app{
       "kelimg: the kel_images routines applied to picture files. Pictures are read as 8-bit "
       "grey and written as 8-bit grey.",

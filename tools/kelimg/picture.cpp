@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <png.h>
+#include <pthread.h>
 #include <stb_image.h>
 #include <stb_image_write.h>
 #include <sys/stat.h>
@@ -12,11 +13,15 @@
 #include <cctype>
 #include <cerrno>
 #include <climits>
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <memory>
+#include <mutex>
+#include <set>
+#include <thread>
 #include <utility>
 
 namespace kelimg {
@@ -68,11 +73,10 @@ bool read_header(const std::vector<uint8_t> &bytes, Header &header) {
                                &header.channels) != 0;
 }
 
-void require_pixel_limit(const Header &header, const std::string &path) {
-  const uint64_t pixels = uint64_t(header.width) * uint64_t(header.height);
-  if (pixels > limits.pixels) {
-    throw InputError("cannot decode " + quoted(path) + ": it is " + std::to_string(header.width) +
-                     " x " + std::to_string(header.height) + " pixels, more than the " +
+void require_pixel_limit(uint64_t width, uint64_t height, const std::string &path) {
+  if (width * height > limits.pixels) {
+    throw InputError("cannot decode " + quoted(path) + ": it is " + std::to_string(width) + " x " +
+                     std::to_string(height) + " pixels, more than the " +
                      std::to_string(limits.pixels) + " that kelimg decodes (--max-pixels)");
   }
 }
@@ -96,14 +100,13 @@ std::vector<uint8_t> read_file(const std::string &path) {
   // The decoder takes the length as an int.
   const uint64_t byte_limit = std::min<uint64_t>(limits.bytes, INT_MAX);
   const auto too_large = [&](const std::string &size) {
-    return InputError("cannot read " + quoted(path) + ": it holds " + size +
-                      " bytes, more than the " + std::to_string(byte_limit) +
-                      " that kelimg reads (--max-bytes)");
+    return InputError("cannot read " + quoted(path) + ": it holds " + size + " than the " +
+                      std::to_string(byte_limit) + " bytes that kelimg reads (--max-bytes)");
   };
   struct stat status;
   if (fstat(fileno(file.get()), &status) == 0 && S_ISREG(status.st_mode) &&
       static_cast<uint64_t>(status.st_size) > byte_limit) {
-    throw too_large(std::to_string(status.st_size));
+    throw too_large(std::to_string(status.st_size) + " bytes, more");
   }
   constexpr size_t kFirstBytes = 1 << 16;
   std::vector<uint8_t> bytes;
@@ -111,14 +114,14 @@ std::vector<uint8_t> read_file(const std::string &path) {
   uint8_t chunk[1 << 16];
   for (;;) {
     const size_t got = std::fread(chunk, 1, sizeof chunk, file.get());
-    if (bytes.size() + got > byte_limit) throw too_large("more than " + std::to_string(byte_limit));
+    if (bytes.size() + got > byte_limit) throw too_large("more");
     bytes.insert(bytes.end(), chunk, chunk + got);
     const bool ended = got < sizeof chunk;
     if (!start_checked && !bytes.empty() && (bytes.size() >= kFirstBytes || ended)) {
       start_checked = true;
       Header header;
       if (read_header(bytes, header)) {
-        require_pixel_limit(header, path);
+        require_pixel_limit(uint64_t(header.width), uint64_t(header.height), path);
       } else if (format_by_signature(bytes).empty()) {
         throw InputError("cannot decode " + quoted(path) + ": it is not a picture in a format " +
                          "kelimg reads (" + kFormatsIn + ")");
@@ -136,16 +139,20 @@ struct StbFree {
   void operator()(void *pixels) const { stbi_image_free(pixels); }
 };
 
-// Binary Netpbm (P5 grey, P6 colour) is looked at before the decoder sees it: this version of
+// Binary Netpbm (P5 grey, P6 colour) is read here before the decoder sees it: this version of
 // stb ignores the largest sample value (maxval) of 8-bit files, reads 16-bit samples in the
-// machine's byte order rather than the file's, and hands back uninitialised pixels for a file
-// cut short. So a short file and a sample above maxval are refused here, and every sample is
-// scaled here from 0 .. maxval to 0 .. 255, rounding to nearest, leaving the decoder an 8-bit
-// file. Returns whether samples were 16-bit. A header that does not parse is left for the
-// decoder to report.
+// machine's byte order rather than the file's, takes a header cut short for a picture of no
+// rows, and hands back uninitialised pixels for a file cut short. So a header that does not
+// parse, a short file and a sample above maxval are refused here, and every sample is scaled
+// here from 0 .. maxval to 0 .. 255, rounding to nearest, leaving the decoder an 8-bit file.
+// Returns whether samples were 16-bit.
 bool prepare_netpbm(std::vector<uint8_t> &bytes, const std::string &path) {
   const size_t size = bytes.size();
   if (size < 2 || bytes[0] != 'P' || (bytes[1] != '5' && bytes[1] != '6')) return false;
+  const std::string kind = bytes[1] == '5' ? "PGM" : "PPM";
+  const auto refuse = [&](const std::string &why) {
+    return InputError("cannot decode " + quoted(path) + ": the " + kind + " " + why);
+  };
   const auto is_space = [](uint8_t c) { return c == ' ' || (c >= '\t' && c <= '\r'); };
   const auto is_digit = [](uint8_t c) { return c >= '0' && c <= '9'; };
   size_t at = 2;
@@ -158,23 +165,21 @@ bool prepare_netpbm(std::vector<uint8_t> &bytes, const std::string &path) {
         ++at;
       }
     }
-    if (at == size || !is_digit(bytes[at])) return false;
+    if (at < size && !is_digit(bytes[at])) throw refuse("header is corrupt");
     for (; at < size && is_digit(bytes[at]); ++at) {
       field = std::min<uint64_t>(field * 10 + (bytes[at] - '0'), uint64_t{1} << 32);
     }
   }
+  if (at == size) throw refuse("is cut short (truncated)");
   const uint64_t width = fields[0], height = fields[1], largest = fields[2];
-  // Sides beyond the decoder's limit of 2^24 are left for it to refuse.
-  if (at == size || !is_space(bytes[at]) || width == 0 || height == 0 || largest == 0 ||
-      largest > 65535 || width > (1 << 24) || height > (1 << 24)) {
-    return false;
+  if (!is_space(bytes[at]) || width == 0 || height == 0 || largest == 0 || largest > 65535) {
+    throw refuse("header is corrupt");
   }
+  require_pixel_limit(width, height, path);
   ++at;  // one whitespace byte ends the header
   const uint64_t sample_bytes = largest > 255 ? 2 : 1;
   const uint64_t samples = width * height * (bytes[1] == '6' ? 3 : 1);
-  if (size - at < samples * sample_bytes) {
-    throw InputError("cannot decode " + quoted(path) + ": the file is cut short (truncated)");
-  }
+  if (size - at < samples * sample_bytes) throw refuse("is cut short (truncated)");
   if (largest == 255) return false;
   const std::string header = std::string("P") + static_cast<char>(bytes[1]) + "\n" +
                              std::to_string(width) + " " + std::to_string(height) + "\n255\n";
@@ -186,8 +191,8 @@ bool prepare_netpbm(std::vector<uint8_t> &bytes, const std::string &path) {
                                 ? bytes[at + i]
                                 : uint64_t{bytes[at + 2 * i]} << 8 | bytes[at + 2 * i + 1];
     if (sample > largest) {
-      throw InputError("cannot decode " + quoted(path) + ": a sample of " + std::to_string(sample) +
-                       " is above the file's largest value (maxval) " + std::to_string(largest));
+      throw refuse("has a sample of " + std::to_string(sample) +
+                   " above its largest value (maxval) " + std::to_string(largest));
     }
     scaled[header.size() + i] = static_cast<uint8_t>((sample * 255 + largest / 2) / largest);
   }
@@ -204,6 +209,8 @@ class Reader {
  public:
   explicit Reader(const std::vector<uint8_t> &bytes) : bytes_(bytes) {}
   bool cut_short() const { return cut_short_; }
+  // Some of stb's decoders stop at the end of the file and fail, rather than read past it.
+  bool at_end() const { return at_ == bytes_.size(); }
   static const stbi_io_callbacks *callbacks() {
     static const stbi_io_callbacks table = {read, skip, at_end};
     return &table;
@@ -238,6 +245,55 @@ class Reader {
   const char *own_buffer_ = nullptr;
   bool cut_short_ = false;
 };
+
+// stb's HDR decoder loops for ever on a run of length 0 in a run-length coded scanline, which
+// a file cut short gives it (it reads zeros past the end), and reads a flat scanline cut short
+// into memory it never wrote. So the scanlines are walked here first, as stb will read them,
+// and a file cut short or a run of 0 is refused; what stb refuses itself is left to it.
+void check_hdr_scanlines(const std::vector<uint8_t> &bytes, const Header &header,
+                         const std::string &path) {
+  const auto refuse = [&](const char *why) {
+    return InputError("cannot decode " + quoted(path) + ": the HDR " + why);
+  };
+  // The header ends with an empty line; the line of the sides follows it.
+  const uint8_t blank[] = {'\n', '\n'};
+  auto at = std::search(bytes.begin(), bytes.end(), std::begin(blank), std::end(blank));
+  if (at != bytes.end()) at = std::find(at + 2, bytes.end(), '\n');
+  if (at == bytes.end()) throw refuse("is cut short (truncated)");
+  size_t next = static_cast<size_t>(at - bytes.begin()) + 1;
+  const auto take = [&](size_t count) {
+    if (bytes.size() - next < count) throw refuse("is cut short (truncated)");
+    next += count;
+    return bytes[next - count];
+  };
+  const uint64_t width = static_cast<uint64_t>(header.width);
+  const uint64_t flat = 4 * width * static_cast<uint64_t>(header.height);
+  if (width < 8 || width >= 32768) {
+    take(flat);
+    return;
+  }
+  for (int row = 0; row < header.height; ++row) {
+    const size_t row_start = next;
+    const uint8_t c1 = take(1), c2 = take(1), high = take(1);
+    if (c1 != 2 || c2 != 2 || (high & 0x80) != 0) {
+      // Not run-length coded after all: stb reads the whole picture flat from here.
+      next = row_start;
+      take(flat);
+      return;
+    }
+    if ((uint64_t{high} << 8 | take(1)) != width) return;
+    for (int channel = 0; channel < 4; ++channel) {
+      for (uint64_t x = 0; x < width;) {
+        const uint64_t count = take(1);
+        const uint64_t run = count > 128 ? count - 128 : count;
+        if (run == 0) throw refuse("is corrupt (a run of length 0)");
+        if (run > width - x) return;
+        take(count > 128 ? 1 : run);
+        x += run;
+      }
+    }
+  }
+}
 
 // stb keeps the reason for its last failure and has no way to clear it, so a decoding that fails
 // without giving one would report an older failure's (a truncated JPEG said "bad png sig"). This
@@ -284,20 +340,28 @@ Picture decode(const std::vector<uint8_t> &bytes, const std::string &path, bool 
                                        std::string(kFormatsIn) + ")"
                                  : "the " + format + " header is corrupt");
   }
-  require_pixel_limit(header, path);
+  if (header.width < 1 || header.height < 1) {
+    throw InputError("cannot decode " + quoted(path) + ": the " + kind + " header gives " +
+                     std::to_string(header.width) + " x " + std::to_string(header.height) +
+                     " pixels (corrupt or cut short)");
+  }
+  require_pixel_limit(uint64_t(header.width), uint64_t(header.height), path);
+  if (format == "HDR") check_hdr_scanlines(bytes, header, path);
+  // stb's PIC decoder converts a picture it failed to read, a null pointer, into any other
+  // number of channels than its own 4; asking for 4 keeps it from doing so.
+  const int channels = format == "PIC" ? 4 : header.channels;
   Reader reader(bytes);
-  int width = 0, height = 0, channels = 0;
+  int width = 0, height = 0, channels_in_file = 0;
   std::unique_ptr<Sample, StbFree> samples;
   if constexpr (sizeof(Sample) == 2) {
     samples.reset(stbi_load_16_from_callbacks(Reader::callbacks(), &reader, &width, &height,
-                                              &channels, header.channels));
+                                              &channels_in_file, channels));
   } else {
-    samples.reset(stbi_load_from_callbacks(Reader::callbacks(), &reader, &width, &height, &channels,
-                                           header.channels));
+    samples.reset(stbi_load_from_callbacks(Reader::callbacks(), &reader, &width, &height,
+                                           &channels_in_file, channels));
   }
-  if (reader.cut_short()) throw cut_short();
+  if (reader.cut_short() || (!samples && reader.at_end())) throw cut_short();
   if (!samples) throw failure("the " + kind + " is corrupt");
-  channels = header.channels;
   Picture picture;
   picture.width = width;
   picture.height = height;
@@ -355,6 +419,81 @@ std::filesystem::path resolve_links(const std::string &path) {
     target = next.is_absolute() ? next : target.parent_path() / next;
   }
   return target;
+}
+
+// The temporary files of outputs not yet in place, so that a signal that ends the tool (Ctrl-C,
+// kill) removes them rather than leaving full-size hidden files behind. One lock covers making,
+// renaming and removing them, so that a signal never finds a file made but not yet listed.
+class Temporaries {
+ public:
+  // Never destroyed: the thread that waits for signals may use it while the tool exits.
+  static Temporaries &get() {
+    static auto *temporaries = new Temporaries;
+    return *temporaries;
+  }
+
+  // mkstemp, listed; -1 with errno set when no file could be made.
+  int create(std::string &name_template) {
+    const std::lock_guard<std::mutex> lock(mutex_);
+    const int fd = mkstemp(name_template.data());
+    if (fd >= 0) paths_.insert(name_template);
+    return fd;
+  }
+  bool rename(const std::string &temporary, const std::string &target) {
+    const std::lock_guard<std::mutex> lock(mutex_);
+    if (std::rename(temporary.c_str(), target.c_str()) != 0) return false;
+    paths_.erase(temporary);
+    return true;
+  }
+  void remove(const std::string &temporary) {
+    const std::lock_guard<std::mutex> lock(mutex_);
+    std::remove(temporary.c_str());
+    paths_.erase(temporary);
+  }
+
+  // SIGINT, SIGTERM and SIGHUP are blocked in the calling thread, before any other starts, so
+  // that every thread inherits the mask and only one waiting thread receives them. It removes
+  // the temporary files and ends the tool with the same signal, as if it had not been caught. A
+  // signal the tool was started ignoring (as a shell starts background jobs ignoring SIGINT)
+  // stays ignored.
+  void remove_on_signals() {
+    sigset_t signals;
+    sigemptyset(&signals);
+    for (const int signal : {SIGINT, SIGTERM, SIGHUP}) {
+      struct sigaction action;
+      if (sigaction(signal, nullptr, &action) == 0 && action.sa_handler != SIG_IGN) {
+        sigaddset(&signals, signal);
+      }
+    }
+    pthread_sigmask(SIG_BLOCK, &signals, nullptr);
+    std::thread([this, signals] {
+      int signal = 0;
+      if (sigwait(&signals, &signal) != 0) return;
+      const std::lock_guard<std::mutex> lock(mutex_);  // held: no file is made after this
+      for (const std::string &path : paths_) unlink(path.c_str());
+      std::signal(signal, SIG_DFL);
+      sigset_t only;
+      sigemptyset(&only);
+      sigaddset(&only, signal);
+      pthread_sigmask(SIG_UNBLOCK, &only, nullptr);
+      raise(signal);
+    }).detach();
+  }
+
+ private:
+  std::mutex mutex_;
+  std::set<std::string> paths_;
+};
+
+// The process's umask, read once: reading it means setting it, which must not race with the
+// files the batch's threads make.
+mode_t process_umask() {
+  static const mode_t mask = [] {
+    const mode_t current = umask(0);
+    umask(current);
+    return current;
+  }();
+  return mask;
 }
 
 struct Encoder {
@@ -455,28 +594,65 @@ PendingOutput::PendingOutput(const std::string &path, std::vector<uint8_t> bytes
     : path_(path), bytes_(std::move(bytes)) {
   if (path == "-") return;  // written at commit, like any stream
   struct stat status;
-  const bool special = stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode);
-  if (special && S_ISDIR(status.st_mode)) {
+  const bool exists = stat(path.c_str(), &status) == 0;
+  if (exists && S_ISDIR(status.st_mode)) {
     throw InputError("cannot write " + output_name(path) + ": it is a directory");
   }
-  target_ = special ? std::string() : resolve_links(path).string();
+  target_ = exists && !S_ISREG(status.st_mode) ? std::string() : resolve_links(path).string();
   if (target_.empty()) {
     target_ = path;  // a device, pipe or socket: written in place at commit, never replaced
     return;
   }
+  if (exists) {
+    // cp opens a file it replaces for writing, so a file the user may not write is refused as
+    // cp refuses it. Opening without truncating changes nothing yet.
+    const int fd = open(target_.c_str(), O_WRONLY | O_CLOEXEC);
+    if (fd < 0) throw InputError("cannot write " + output_name(path) + ": " + system_reason());
+    close(fd);
+    // Another name of the same file (a hard link) sees the new content only if it is written
+    // in place, as cp writes it; a rename would leave that name on the old content.
+    if (status.st_nlink > 1) {
+      rewrite_ = true;
+      return;
+    }
+  }
   const std::filesystem::path target(target_);
   const std::filesystem::path directory =
       target.has_parent_path() ? target.parent_path() : std::filesystem::path(".");
-  temporary_ = (directory / ("." + target.filename().string() + ".XXXXXX")).string();
-  const int fd = mkstemp(temporary_.data());
+  // The temporary name adds 8 bytes to the file's; a name near the longest the directory takes
+  // is shortened in it, so that every name that can be written can be replaced.
+  std::string name = target.filename().string();
+  const long longest = pathconf(directory.c_str(), _PC_NAME_MAX);
+  const size_t room = (longest > 8 ? static_cast<size_t>(longest) : 255) - 8;
+  if (name.size() > room) name.resize(room);
+  temporary_ = (directory / ("." + name + ".XXXXXX")).string();
+  const int fd = Temporaries::get().create(temporary_);
   if (fd < 0) {
+    const int failure = errno;
     temporary_.clear();
-    throw InputError("cannot write " + output_name(path) + ": " + system_reason());
+    // In a directory the user may not write, a file they may write is written in place, as cp
+    // writes it: no temporary file can be made beside it.
+    if (exists && (failure == EACCES || failure == EPERM)) {
+      rewrite_ = true;
+      return;
+    }
+    throw InputError("cannot write " + output_name(path) + ": " + std::strerror(failure));
   }
-  // mkstemp makes the file private; give it the permissions an ordinary new file gets.
-  const mode_t mask = umask(0);
-  umask(mask);
-  int failure = fchmod(fd, 0666 & ~mask) == 0 ? 0 : errno;
+  // A replaced file keeps its owner and mode, as one written in place would; where the owner
+  // cannot be given to the new file, the old one is written in place instead. A new file gets
+  // what an ordinary new file gets (mkstemp makes it private).
+  int failure = 0;
+  struct stat made;
+  if (exists && fstat(fd, &made) == 0 &&
+      (made.st_uid != status.st_uid || made.st_gid != status.st_gid) &&
+      fchown(fd, status.st_uid, status.st_gid) != 0) {
+    close(fd);
+    Temporaries::get().remove(temporary_);
+    temporary_.clear();
+    rewrite_ = true;
+    return;
+  }
+  if (fchmod(fd, exists ? status.st_mode & 07777 : 0666 & ~process_umask()) != 0) failure = errno;
   if (failure == 0) failure = write_all(fd, bytes_.data(), bytes_.size());
   if (close(fd) != 0 && failure == 0) failure = errno;
   bytes_.clear();
@@ -487,32 +663,39 @@ PendingOutput::PendingOutput(PendingOutput &&other) noexcept
     : path_(std::move(other.path_)),
       target_(std::move(other.target_)),
       temporary_(std::exchange(other.temporary_, std::string())),
-      bytes_(std::move(other.bytes_)) {}
+      bytes_(std::move(other.bytes_)),
+      rewrite_(other.rewrite_) {}
 
 PendingOutput::~PendingOutput() {
-  if (!temporary_.empty()) std::remove(temporary_.c_str());
+  if (!temporary_.empty()) Temporaries::get().remove(temporary_);
 }
 
 void PendingOutput::fail(int failure) {
-  if (!temporary_.empty()) std::remove(temporary_.c_str());
+  if (!temporary_.empty()) Temporaries::get().remove(temporary_);
   temporary_.clear();
   throw InputError("cannot write " + output_name(path_) + ": " + std::strerror(failure));
 }
 
 void PendingOutput::commit() {
   if (!temporary_.empty()) {
-    if (std::rename(temporary_.c_str(), target_.c_str()) != 0) fail(errno);
+    if (!Temporaries::get().rename(temporary_, target_)) fail(errno);
     temporary_.clear();
     return;
   }
-  // Appending continues a file reached through /dev/stdout where the descriptor has got to,
-  // rather than at its start; to devices and pipes it makes no difference.
+  // A regular file written in place is truncated first, as cp does. Appending continues a file
+  // reached through /dev/stdout where the descriptor has got to, rather than at its start; to
+  // devices and pipes it makes no difference.
   const int fd =
-      path_ == "-" ? STDOUT_FILENO : open(target_.c_str(), O_WRONLY | O_APPEND | O_CLOEXEC);
+      path_ == "-" ? STDOUT_FILENO
+                   : open(target_.c_str(), O_WRONLY | O_CLOEXEC | (rewrite_ ? O_TRUNC : O_APPEND));
   if (fd < 0) fail(errno);
   int failure = write_all(fd, bytes_.data(), bytes_.size());
   if (fd != STDOUT_FILENO && close(fd) != 0 && failure == 0) failure = errno;
   if (failure != 0) fail(failure);
+}
+
+void remove_temporaries_on_signals() {
+  Temporaries::get().remove_on_signals();
 }
 
 PendingOutput stage_picture(const std::string &path, const Picture &picture) {

@@ -64,8 +64,12 @@ Format output_format(const std::string &path);
 
 // An output whose bytes are ready but not yet in place. A regular file (or one not there yet)
 // is written to a temporary file beside it, which commit() renames over it: a failure before
-// then leaves the target as it was. "-" is standard output, and devices, pipes and other
-// special files are written in place at commit(), never replaced. Symbolic links are followed.
+// then leaves the target as it was, and the replaced file keeps its mode and owner. A file
+// cp would refuse to write (no write permission) is refused. Where cp's result cannot be had by
+// a rename, the file is written in place at commit(), as cp writes it: when it has other names
+// (hard links), when its directory cannot take a temporary file, or when the new file could not
+// be given its owner. "-" is standard output, and devices, pipes and other special files are
+// written in place at commit(), never replaced. Symbolic links are followed.
 class PendingOutput {
  public:
   PendingOutput(const std::string &path, std::vector<uint8_t> bytes);
@@ -81,8 +85,13 @@ class PendingOutput {
   std::string path_;            // as the user gave it, for messages
   std::string target_;          // with symbolic links followed
   std::string temporary_;       // the staged file, while there is one
-  std::vector<uint8_t> bytes_;  // for special files, until commit
+  std::vector<uint8_t> bytes_;  // for what is written in place, until commit
+  bool rewrite_ = false;        // a regular file written in place: truncated at commit
 };
+
+// Makes SIGINT, SIGTERM and SIGHUP remove the temporary files of outputs not yet committed
+// before they end the tool. Call once, before any other thread starts.
+void remove_temporaries_on_signals();
 
 // Encodes the picture in the format its name asks for and stages it.
 PendingOutput stage_picture(const std::string &path, const Picture &picture);
