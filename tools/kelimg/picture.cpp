@@ -156,6 +156,9 @@ bool prepare_netpbm(std::vector<uint8_t> &bytes, const std::string &path) {
   const auto is_space = [](uint8_t c) { return c == ' ' || (c >= '\t' && c <= '\r'); };
   const auto is_digit = [](uint8_t c) { return c >= '0' && c <= '9'; };
   size_t at = 2;
+  // Fields are held to just above the decoder's largest side, 2^24, so that products of them
+  // stay far inside 64 bits; such a side is refused by the pixel limit or the decoder.
+  constexpr uint64_t kLargestSide = uint64_t{1} << 24;
   uint64_t fields[3] = {};  // width, height, largest sample value
   for (uint64_t &field : fields) {
     while (at < size && (is_space(bytes[at]) || bytes[at] == '#')) {
@@ -167,7 +170,7 @@ bool prepare_netpbm(std::vector<uint8_t> &bytes, const std::string &path) {
     }
     if (at < size && !is_digit(bytes[at])) throw refuse("header is corrupt");
     for (; at < size && is_digit(bytes[at]); ++at) {
-      field = std::min<uint64_t>(field * 10 + (bytes[at] - '0'), uint64_t{1} << 32);
+      field = std::min<uint64_t>(field * 10 + (bytes[at] - '0'), kLargestSide + 1);
     }
   }
   if (at == size) throw refuse("is cut short (truncated)");
@@ -485,8 +488,8 @@ class Temporaries {
   std::set<std::string> paths_;
 };
 
-// The process's umask, read once: reading it means setting it, which must not race with the
-// files the batch's threads make.
+// The process's umask, read once, before the batch's threads start: reading it means setting it,
+// which must not race with the files they make.
 mode_t process_umask() {
   static const mode_t mask = [] {
     const mode_t current = umask(0);
@@ -655,7 +658,7 @@ PendingOutput::PendingOutput(const std::string &path, std::vector<uint8_t> bytes
   if (fchmod(fd, exists ? status.st_mode & 07777 : 0666 & ~process_umask()) != 0) failure = errno;
   if (failure == 0) failure = write_all(fd, bytes_.data(), bytes_.size());
   if (close(fd) != 0 && failure == 0) failure = errno;
-  bytes_.clear();
+  bytes_ = std::vector<uint8_t>();  // a batch stages every output before it commits any
   if (failure != 0) fail(failure);
 }
 
@@ -695,6 +698,7 @@ void PendingOutput::commit() {
 }
 
 void remove_temporaries_on_signals() {
+  process_umask();  // read here, while no other thread makes files
   Temporaries::get().remove_on_signals();
 }
 
