@@ -7,8 +7,6 @@
 #include <pybind11/numpy.h>
 #include <pybind11/pybind11.h>
 
-#include <algorithm>
-#include <cmath>
 #include <cstdint>
 #include <cstdlib>
 #include <limits>
@@ -20,35 +18,23 @@
 
 namespace py = pybind11;
 
-// Any object passed where a picture or histogram, an integer or a flag belongs. Each is taken as
-// it is, so that the module, not pybind11's conversions, decides what it accepts and says what is
-// wrong with it; the signatures name what it must be. pybind11 would turn np.float32(2.9) into 2
-// and 0.5 into True.
+// Any object passed where a picture or histogram belongs. It is taken as it is, so that the
+// module, not pybind11's overload matching, says what is wrong with it; its signatures name the
+// numpy array it must be.
 struct ArrayArgument {
   py::handle object;
   operator py::handle() const { return object; }
 };
-struct IntegerArgument {
-  py::handle object;
-};
-struct FlagArgument {
-  py::handle object;
-};
 
 namespace pybind11::detail {
-#define KEL_ANY_OBJECT_CASTER(Argument, python_name)         \
-  template <>                                                \
-  struct type_caster<Argument> {                             \
-    PYBIND11_TYPE_CASTER(Argument, const_name(python_name)); \
-    bool load(handle source, bool) {                         \
-      value.object = source;                                 \
-      return true;                                           \
-    }                                                        \
-  };
-KEL_ANY_OBJECT_CASTER(ArrayArgument, "numpy.ndarray")
-KEL_ANY_OBJECT_CASTER(IntegerArgument, "int")
-KEL_ANY_OBJECT_CASTER(FlagArgument, "bool")
-#undef KEL_ANY_OBJECT_CASTER
+template <>
+struct type_caster<ArrayArgument> {
+  PYBIND11_TYPE_CASTER(ArrayArgument, const_name("numpy.ndarray"));
+  bool load(handle source, bool) {
+    value.object = source;
+    return true;
+  }
+};
 }  // namespace pybind11::detail
 
 namespace {
@@ -73,15 +59,12 @@ const char *dtype_name() {
   throw py::value_error(message);
 }
 
-std::string type_name(const py::handle &object) {
-  return py::str(py::type::handle_of(object).attr("__name__"));
-}
-
 // The array behind name, or a TypeError naming what it is instead.
 template <typename Element>
 py::array array_of(const py::handle &object, const char *name, const char *element_name) {
   if (!py::isinstance<py::array>(object)) {
-    type_error(std::string(name) + " must be a numpy array, not " + type_name(object));
+    type_error(std::string(name) + " must be a numpy array, not " +
+               std::string(py::str(py::type::handle_of(object).attr("__name__"))));
   }
   auto array = py::reinterpret_borrow<py::array>(object);
   if (!py::isinstance<py::array_t<Element>>(array)) {
@@ -116,36 +99,16 @@ Picture<Pixel> writable_picture(const py::handle &object, const char *name) {
   return result;
 }
 
-// An integer argument as the C argument type Target. Only what Python itself takes as an index
-// is an integer (int, numpy's integers, a 0-d integer array: what operator.index accepts), so a
-// float of any kind, a Fraction, a Decimal or a 1-element array is a TypeError rather than
-// being truncated; an integer outside Target is a ValueError naming the range it must lie in.
+// value as the C argument type Target, or a ValueError naming the range it must lie in.
 template <typename Target>
-Target narrow(const IntegerArgument &argument, const char *name) {
-  const auto index = py::reinterpret_steal<py::object>(PyNumber_Index(argument.object.ptr()));
-  if (!index) {
-    PyErr_Clear();
-    type_error(std::string(name) + " must be an integer, not " + type_name(argument.object));
-  }
-  int overflow = 0;
-  const long long value = PyLong_AsLongLongAndOverflow(index.ptr(), &overflow);
-  constexpr auto low = static_cast<long long>(std::numeric_limits<Target>::min());
-  constexpr auto high = static_cast<long long>(std::numeric_limits<Target>::max());
-  if (overflow != 0 || value < low || value > high) {
+Target narrow(int64_t value, const char *name) {
+  constexpr auto low = static_cast<int64_t>(std::numeric_limits<Target>::min());
+  constexpr auto high = static_cast<int64_t>(std::numeric_limits<Target>::max());
+  if (value < low || value > high) {
     value_error(std::string(name) + " must be in " + std::to_string(low) + ".." +
-                std::to_string(high) + ", not " + std::string(py::str(index)));
+                std::to_string(high) + ", not " + std::to_string(value));
   }
   return static_cast<Target>(value);
-}
-
-// A flag argument: True or False, Python's or numpy's, and nothing that merely has a truth value.
-bool flag(const FlagArgument &argument, const char *name) {
-  const py::handle object = argument.object;
-  if (PyBool_Check(object.ptr()) ||
-      py::isinstance(object, py::module_::import("numpy").attr("bool_"))) {
-    return PyObject_IsTrue(object.ptr()) == 1;
-  }
-  type_error(std::string(name) + " must be True or False, not " + type_name(object));
 }
 
 // The C routines take their sides in 32 or 16 bits and some form height * width in 32 bits;
@@ -194,10 +157,9 @@ py::array_t<uint32_t> histogram(ArrayArgument img) {
   return hist;
 }
 
-py::array_t<uint32_t> histogram_n(ArrayArgument img, IntegerArgument bits_value) {
+py::array_t<uint32_t> histogram_n(ArrayArgument img, int64_t bits) {
   auto source = picture<const uint8_t>(img, "img");
   auto [height, width] = sides<int32_t>(source, "img", kMaxCountedPixels);
-  const int64_t bits = narrow<int64_t>(bits_value, "bits");
   // Above 8 the C routine counts 256 bins but the array would promise 2**bits.
   if (bits < 0 || bits > 8) value_error("bits must be in 0..8, not " + std::to_string(bits));
   py::array_t<uint32_t> hist(int64_t{1} << bits);
@@ -207,14 +169,14 @@ py::array_t<uint32_t> histogram_n(ArrayArgument img, IntegerArgument bits_value)
   return hist;
 }
 
-int hist_mean(ArrayArgument hist, IntegerArgument count) {
+int hist_mean(ArrayArgument hist, int64_t count) {
   const uint32_t *bins = histogram_bins(hist);
   const uint32_t n = narrow<uint32_t>(count, "count");
   py::gil_scoped_release unlocked;
   return kel_hist_mean(bins, n);
 }
 
-int hist_var(ArrayArgument hist, IntegerArgument mean, IntegerArgument count) {
+int hist_var(ArrayArgument hist, int64_t mean, int64_t count) {
   const uint32_t *bins = histogram_bins(hist);
   const uint8_t m = narrow<uint8_t>(mean, "mean");
   const uint32_t n = narrow<uint32_t>(count, "count");
@@ -222,7 +184,7 @@ int hist_var(ArrayArgument hist, IntegerArgument mean, IntegerArgument count) {
   return kel_hist_var(bins, m, n);
 }
 
-int hist_std(ArrayArgument hist, IntegerArgument mean, IntegerArgument count) {
+int hist_std(ArrayArgument hist, int64_t mean, int64_t count) {
   const uint32_t *bins = histogram_bins(hist);
   const uint8_t m = narrow<uint8_t>(mean, "mean");
   const uint32_t n = narrow<uint32_t>(count, "count");
@@ -230,33 +192,12 @@ int hist_std(ArrayArgument hist, IntegerArgument mean, IntegerArgument count) {
   return kel_hist_std(bins, m, n);
 }
 
-// var and std: the statistic and the truncated mean that the routine stores beside it, or with
-// exact=True the true figures as numpy gives them (population variance, float64), from a
-// histogram: its bins cannot wrap below 2**31 pixels, and its sums are taken in 64 bits.
+// var and std: the statistic and the truncated mean that the routine stores beside it.
 template <typename Statistic>
-py::tuple image_statistic(ArrayArgument img, FlagArgument exact_value,
-                          Statistic (*routine)(const uint8_t *, int32_t, int32_t, uint8_t *),
-                          bool deviation) {
+py::tuple image_statistic(ArrayArgument img,
+                          Statistic (*routine)(const uint8_t *, int32_t, int32_t, uint8_t *)) {
   auto source = picture<const uint8_t>(img, "img");
   auto [height, width] = sides<int32_t>(source, "img", kMaxCountedPixels);
-  if (flag(exact_value, "exact")) {
-    uint32_t bins[256];
-    {
-      py::gil_scoped_release unlocked;
-      kel_image_histogram(source.pixels, height, width, bins);
-    }
-    const double count = static_cast<double>(int64_t{height} * width);
-    if (count == 0) return py::make_tuple(std::nan(""), std::nan(""));
-    uint64_t sum = 0;
-    for (uint32_t value = 0; value < 256; ++value) sum += uint64_t{bins[value]} * value;
-    const double mean = static_cast<double>(sum) / count;
-    double squares = 0;
-    for (uint32_t value = 0; value < 256; ++value) {
-      squares += bins[value] * (value - mean) * (value - mean);
-    }
-    const double variance = squares / count;
-    return py::make_tuple(deviation ? std::sqrt(variance) : variance, mean);
-  }
   uint8_t mean = 0;
   Statistic value = 0;
   {
@@ -266,11 +207,11 @@ py::tuple image_statistic(ArrayArgument img, FlagArgument exact_value,
   return py::make_tuple(value, mean);
 }
 
-py::tuple var(ArrayArgument img, FlagArgument exact) {
-  return image_statistic(img, exact, kel_image_var, false);
+py::tuple var(ArrayArgument img) {
+  return image_statistic(img, kel_image_var);
 }
-py::tuple std_dev(ArrayArgument img, FlagArgument exact) {
-  return image_statistic(img, exact, kel_image_std, true);
+py::tuple std_dev(ArrayArgument img) {
+  return image_statistic(img, kel_image_std);
 }
 
 // The canvas and the corner's place on it, the canvas handed to numpy with free as its release.
@@ -291,9 +232,8 @@ py::tuple canvas_result(const Rotated &rotated) {
   return py::make_tuple(canvas, py::make_tuple(rotated.offset_y, rotated.offset_x));
 }
 
-py::tuple rotate(ArrayArgument img, IntegerArgument angle_value, FlagArgument nearest_value) {
+py::tuple rotate(ArrayArgument img, int64_t angle_value, bool nearest) {
   const uint8_t angle = narrow<uint8_t>(angle_value, "angle");
-  const bool nearest = flag(nearest_value, "nearest");
   Rotated out;
   if (py::isinstance<py::array_t<int8_t>>(img)) {
     auto source = picture<const int8_t>(img, "img");
@@ -331,7 +271,7 @@ py::tuple rotate(ArrayArgument img, IntegerArgument angle_value, FlagArgument ne
 template <typename Argument>
 py::array_t<uint8_t> point_operation(void (*operation)(const uint8_t *, uint32_t, uint32_t,
                                                        Argument, uint8_t *),
-                                     ArrayArgument img, IntegerArgument value, const char *name) {
+                                     ArrayArgument img, int64_t value, const char *name) {
   auto source = picture<const uint8_t>(img, "img");
   auto [height, width] = sides<uint32_t>(source, "img", kMaxPointPixels);
   const Argument argument = narrow<Argument>(value, name);
@@ -342,15 +282,15 @@ py::array_t<uint8_t> point_operation(void (*operation)(const uint8_t *, uint32_t
   return result;
 }
 
-py::array_t<uint8_t> brighten(ArrayArgument img, IntegerArgument percent) {
+py::array_t<uint8_t> brighten(ArrayArgument img, int64_t percent) {
   return point_operation(kel_image_brighten, img, percent, "percent");
 }
 
-py::array_t<uint8_t> darken(ArrayArgument img, IntegerArgument percent) {
+py::array_t<uint8_t> darken(ArrayArgument img, int64_t percent) {
   return point_operation(kel_image_darken, img, percent, "percent");
 }
 
-py::array_t<uint8_t> get_mask(ArrayArgument img, IntegerArgument key) {
+py::array_t<uint8_t> get_mask(ArrayArgument img, int64_t key) {
   return point_operation(kel_get_mask, img, key, "key");
 }
 
@@ -384,8 +324,8 @@ py::array_t<uint8_t> mask_image(ArrayArgument img, ArrayArgument mask) {
 using Composite = void (*)(uint8_t *, int32_t, int32_t, const uint8_t *, uint16_t, uint16_t,
                            int32_t, int32_t, uint16_t);
 
-void composite(Composite operation, ArrayArgument dst, ArrayArgument src, IntegerArgument x,
-               IntegerArgument y, IntegerArgument key) {
+void composite(Composite operation, ArrayArgument dst, ArrayArgument src, int64_t x, int64_t y,
+               int64_t key) {
   auto target = writable_picture<uint8_t>(dst, "dst");
   auto source = picture<const uint8_t>(src, "src");
   auto [dst_height, dst_width] = sides<int32_t>(target, "dst");
@@ -398,13 +338,11 @@ void composite(Composite operation, ArrayArgument dst, ArrayArgument src, Intege
             key16);
 }
 
-void draw_image(ArrayArgument dst, ArrayArgument src, IntegerArgument x, IntegerArgument y,
-                IntegerArgument key) {
+void draw_image(ArrayArgument dst, ArrayArgument src, int64_t x, int64_t y, int64_t key) {
   composite(kel_image_draw_image, dst, src, x, y, key);
 }
 
-void blend_image(ArrayArgument dst, ArrayArgument src, IntegerArgument x, IntegerArgument y,
-                 IntegerArgument key) {
+void blend_image(ArrayArgument dst, ArrayArgument src, int64_t x, int64_t y, int64_t key) {
   composite(kel_image_blend_image, dst, src, x, y, key);
 }
 
@@ -420,8 +358,7 @@ Canvas drawing_target(ArrayArgument img) {
   return {target.pixels, height, width};
 }
 
-void draw_line(ArrayArgument img, IntegerArgument x0, IntegerArgument y0, IntegerArgument x1,
-               IntegerArgument y1, IntegerArgument colour) {
+void draw_line(ArrayArgument img, int64_t x0, int64_t y0, int64_t x1, int64_t y1, int64_t colour) {
   const Canvas canvas = drawing_target(img);
   const int32_t ends[] = {narrow<int32_t>(x0, "x0"), narrow<int32_t>(y0, "y0"),
                           narrow<int32_t>(x1, "x1"), narrow<int32_t>(y1, "y1")};
@@ -431,9 +368,8 @@ void draw_line(ArrayArgument img, IntegerArgument x0, IntegerArgument y0, Intege
                       ends[3], c);
 }
 
-void draw_triangle(ArrayArgument img, IntegerArgument x0, IntegerArgument y0, IntegerArgument x1,
-                   IntegerArgument y1, IntegerArgument x2, IntegerArgument y2,
-                   IntegerArgument colour) {
+void draw_triangle(ArrayArgument img, int64_t x0, int64_t y0, int64_t x1, int64_t y1, int64_t x2,
+                   int64_t y2, int64_t colour) {
   const Canvas canvas = drawing_target(img);
   const int32_t corners[] = {narrow<int32_t>(x0, "x0"), narrow<int32_t>(y0, "y0"),
                              narrow<int32_t>(x1, "x1"), narrow<int32_t>(y1, "y1"),
@@ -444,8 +380,8 @@ void draw_triangle(ArrayArgument img, IntegerArgument x0, IntegerArgument y0, In
                           corners[2], corners[3], corners[4], corners[5], c);
 }
 
-void draw_rectangle(ArrayArgument img, IntegerArgument x, IntegerArgument y, IntegerArgument width,
-                    IntegerArgument height, IntegerArgument colour) {
+void draw_rectangle(ArrayArgument img, int64_t x, int64_t y, int64_t width, int64_t height,
+                    int64_t colour) {
   const Canvas canvas = drawing_target(img);
   const int32_t x32 = narrow<int32_t>(x, "x"), y32 = narrow<int32_t>(y, "y");
   const uint32_t w = narrow<uint32_t>(width, "width"), h = narrow<uint32_t>(height, "height");
@@ -454,8 +390,8 @@ void draw_rectangle(ArrayArgument img, IntegerArgument x, IntegerArgument y, Int
   kel_image_draw_rectangle(canvas.pixels, canvas.height, canvas.width, x32, y32, w, h, c);
 }
 
-void draw_number(ArrayArgument img, IntegerArgument value, IntegerArgument min_digits,
-                 IntegerArgument x, IntegerArgument y, IntegerArgument colour) {
+void draw_number(ArrayArgument img, int64_t value, int64_t min_digits, int64_t x, int64_t y,
+                 int64_t colour) {
   const Canvas canvas = drawing_target(img);
   const int32_t v = narrow<int32_t>(value, "value");
   const uint8_t digits = narrow<uint8_t>(min_digits, "min_digits");
@@ -465,8 +401,7 @@ void draw_number(ArrayArgument img, IntegerArgument value, IntegerArgument min_d
   kel_image_draw_number(canvas.pixels, canvas.height, canvas.width, v, digits, x32, y32, c);
 }
 
-void draw_circle(ArrayArgument img, IntegerArgument diameter, IntegerArgument x, IntegerArgument y,
-                 IntegerArgument colour) {
+void draw_circle(ArrayArgument img, int64_t diameter, int64_t x, int64_t y, int64_t colour) {
   const Canvas canvas = drawing_target(img);
   const uint32_t d = narrow<uint32_t>(diameter, "diameter");
   const int32_t x32 = narrow<int32_t>(x, "x"), y32 = narrow<int32_t>(y, "y");
@@ -475,18 +410,14 @@ void draw_circle(ArrayArgument img, IntegerArgument diameter, IntegerArgument x,
   kel_image_draw_circle(canvas.pixels, canvas.height, canvas.width, d, x32, y32, c);
 }
 
-// kel_set_pixel takes the column in 16 bits. Called on the one-row raster that starts at the
-// pixel's row and at the column's multiple of 65536, it reaches every column of any picture.
-void set_pixel(ArrayArgument img, IntegerArgument y, IntegerArgument x, IntegerArgument colour) {
+void set_pixel(ArrayArgument img, int64_t y, int64_t x, int64_t colour) {
   auto target = writable_picture<uint8_t>(img, "img");
-  const int64_t row = narrow<int64_t>(y, "y"), column = narrow<int64_t>(x, "x");
+  auto [height, width] = sides<uint32_t>(target, "img");
+  const uint32_t y32 = narrow<uint32_t>(y, "y");
+  const uint16_t x16 = narrow<uint16_t>(x, "x");
   const uint8_t c = narrow<uint8_t>(colour, "colour");
-  if (row < 0 || row >= target.height || column < 0 || column >= target.width) return;
-  const int64_t first_column = column & ~int64_t{0xffff};
-  uint8_t *strip = target.pixels + row * target.width + first_column;
-  const auto strip_width =
-      static_cast<uint32_t>(std::min<int64_t>(target.width - first_column, 65536));
-  kel_set_pixel(strip, 1, strip_width, 0, static_cast<uint16_t>(column - first_column), c);
+  py::gil_scoped_release unlocked;
+  kel_set_pixel(target.pixels, height, width, y32, x16, c);
 }
 
 }  // namespace
@@ -502,30 +433,18 @@ PYBIND11_MODULE(_kel_images, m) {
   m.def("histogram_n", &histogram_n, arg("img"), arg("bits"),
         "Counts each pixel into the bin of its top `bits` bits (0..8); returns uint32[2**bits].");
   m.def("hist_mean", &hist_mean, arg("hist"), arg("count"),
-        "The low 8 bits of (sum of i * hist[i]) // count over a 256-bin histogram of `count` "
-        "pixels; 0 for count 0. The sum wraps modulo 2**32, as the C library's sums do: from "
-        "16,843,010 pixels of 255 on the result is not the mean.");
+        "The mean of a 256-bin histogram of `count` pixels, truncated to its low 8 bits; 0 for "
+        "count 0.");
   m.def("hist_var", &hist_var, arg("hist"), arg("mean"), arg("count"),
-        "The low 16 bits of (sum of hist[i] * (i - mean)**2) // count, the population variance "
-        "about `mean` (as hist_mean gives it); 0 for count 0. The sum wraps modulo 2**32, as the "
-        "C library's sums do: a 640 x 480 picture of 0s and 255s already passes it.");
+        "The population variance about `mean` (as hist_mean gives it), truncated to its low 16 "
+        "bits; 0 for count 0.");
   m.def("hist_std", &hist_std, arg("hist"), arg("mean"), arg("count"),
-        "floor(sqrt(v)) for v = hist_var(hist, mean, count) below 16384, which the mean that "
-        "hist_mean gives for the histogram's own count always keeps it (16256 at most). The root "
-        "is taken of v * 2**18 in 32 bits, so a larger v (another mean, or a count below the "
-        "histogram's total) gives floor(sqrt(v % 16384)).");
-  m.def("var", &var, arg("img"), arg("exact") = false,
-        "The variance of a uint8 picture's intensities and their mean: (var, mean). By default "
-        "the C library's whole numbers, population variance about the truncated mean, from sums "
-        "that wrap modulo 2**32: wrong from about 264,000 pixels of extreme values on (a 640 x 480 "
-        "picture of alternate columns of 0 and 255 gives 2275, not 16256). exact=True gives the "
-        "true figures as floats, as numpy's img.var() and img.mean() give them (nan for an "
-        "empty picture).");
-  m.def("std", &std_dev, arg("img"), arg("exact") = false,
-        "The standard deviation of a uint8 picture's intensities and their mean: (std, mean). By "
-        "default the C library's whole numbers, floor(sqrt(var(img)[0])) and the truncated mean, "
-        "from sums that wrap modulo 2**32 (see var). exact=True gives the true figures as "
-        "floats, as numpy's img.std() and img.mean() give them.");
+        "floor(sqrt(hist_var(hist, mean, count))), in the library's fixed point.");
+  m.def("var", &var, arg("img"),
+        "The variance of a uint8 picture's intensities and their truncated mean: (var, mean).");
+  m.def("std", &std_dev, arg("img"),
+        "The standard deviation of a uint8 picture's intensities and their truncated mean: "
+        "(std, mean).");
   m.def("rotate", &rotate, arg("img"), arg("angle"), arg("nearest") = false,
         "Turns a picture by angle * 2pi / 256 (angle 0..255) about its corner (0, 0) onto a new "
         "canvas just large enough; returns (canvas, (offset_y, offset_x)), the offsets being "
@@ -565,6 +484,5 @@ PYBIND11_MODULE(_kel_images, m) {
         "Draws the clipped outline of an octagonal circle of the given diameter around (x, y), "
         "in place.");
   m.def("set_pixel", &set_pixel, arg("img"), arg("y"), arg("x"), arg("colour"),
-        "Writes colour at row y, column x when that lies inside the picture (row first); a "
-        "position outside it, negative ones included, writes nothing.");
+        "Writes colour at row y, column x when that lies inside the picture (row first).");
 }

@@ -10,7 +10,6 @@
 #include <atomic>
 #include <charconv>
 #include <cinttypes>
-#include <climits>
 #include <cmath>
 #include <csignal>
 #include <cstdio>
@@ -539,18 +538,6 @@ int main(int argc, char **argv) {
       "kelimg"};
   app.set_version_flag("--version", version(), "print the version and exit");
   app.require_subcommand(1);
-  // The limits are the tool's, not a command's: they may come before or after the command.
-  app.fallthrough();
-  kelimg::InputLimits limits;
-  app.add_option("--max-pixels", limits.pixels,
-                 "refuse a picture of more pixels, from its header, before decoding it (default " +
-                     std::to_string(limits.pixels) + ", 16384 x 16384)")
-      ->check(whole_number(1, INT64_MAX));
-  app.add_option("--max-bytes", limits.bytes,
-                 "refuse an input of more bytes without reading further (default " +
-                     std::to_string(limits.bytes) + ", 1 GiB; at most " + std::to_string(INT_MAX) +
-                     ")")
-      ->check(whole_number(1, INT_MAX));
   const std::vector<Subcommand> commands = {
       add_stats(app),
       add_rotate(app),
@@ -571,9 +558,8 @@ int main(int argc, char **argv) {
   // Set after the subcommands, which would otherwise take it over.
   app.footer(std::string("Formats in: ") + kelimg::kFormatsIn +
              ".\nFormats out: " + kelimg::kFormatsOut +
-             ".\nInputs that start with no picture's signature are refused after their first 64 "
-             "KiB, and pictures above --max-pixels from their header.\nRun kelimg COMMAND --help "
-             "for a command's options. Exit status: 0 done, 2 bad input (nothing written).");
+             ".\nRun kelimg COMMAND --help for a command's options. Exit status: 0 done, 2 bad "
+             "input (nothing written).");
 
   if (argc < 2) {
     std::fputs(app.help().c_str(), stdout);
@@ -591,7 +577,6 @@ int main(int argc, char **argv) {
   std::string context = "kelimg";
   try {
     app.parse(argc, argv);
-    kelimg::set_input_limits(limits);
     for (const Subcommand &command : commands) {
       if (!command.app->parsed()) continue;
       context += " " + command.app->get_name();

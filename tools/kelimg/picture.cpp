@@ -8,7 +8,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <atomic>
 #include <cctype>
 #include <cerrno>
 #include <climits>
@@ -34,97 +33,24 @@ std::string system_reason() {
   return std::strerror(errno);
 }
 
-// Standard input holds one picture; naming it twice would read it empty the second time.
-std::atomic<bool> stdin_taken{false};
-
-InputLimits limits;
-
-// The formats kelimg reads, by the bytes they start with; TGA has no signature and is known only
-// by a header that the decoder accepts. Names the format in messages, and tells a picture cut
-// short from a stream that is no picture at all, which is refused after its first bytes.
-std::string format_by_signature(const std::vector<uint8_t> &bytes) {
-  static const std::pair<const char *, std::string> kSignatures[] = {
-      {"PNG", "\x89PNG"}, {"JPEG", "\xff\xd8"},  {"BMP", "BM"},     {"GIF", "GIF8"},
-      {"PSD", "8BPS"},    {"HDR", "#?RADIANCE"}, {"HDR", "#?RGBE"}, {"PIC", "\x53\x80\xf6\x34"},
-      {"PGM", "P5"},      {"PPM", "P6"}};
-  for (const auto &[name, signature] : kSignatures) {
-    if (bytes.size() >= signature.size() &&
-        std::equal(signature.begin(), signature.end(), bytes.begin(),
-                   [](char a, uint8_t b) { return static_cast<uint8_t>(a) == b; })) {
-      return name;
-    }
-  }
-  return "";
-}
-
-struct Header {
-  int width = 0, height = 0, channels = 0;
-};
-
-// The sides the decoder finds in the header, if it recognises one.
-bool read_header(const std::vector<uint8_t> &bytes, Header &header) {
-  const int length = static_cast<int>(std::min<size_t>(bytes.size(), INT_MAX));
-  return stbi_info_from_memory(bytes.data(), length, &header.width, &header.height,
-                               &header.channels) != 0;
-}
-
-void require_pixel_limit(const Header &header, const std::string &path) {
-  const uint64_t pixels = uint64_t(header.width) * uint64_t(header.height);
-  if (pixels > limits.pixels) {
-    throw InputError("cannot decode " + quoted(path) + ": it is " + std::to_string(header.width) +
-                     " x " + std::to_string(header.height) + " pixels, more than the " +
-                     std::to_string(limits.pixels) + " that kelimg decodes (--max-pixels)");
-  }
-}
-
-// Reads a whole input, refusing as early as it can what would cost more than the limits: a file
-// larger than the byte limit before reading it, a stream as soon as it passes it, a header that
-// announces more pixels than the limit, and bytes that start no picture at all, after the
-// first 64 KiB. So a deflate bomb stops at its header, and /dev/zero or /dev/urandom at once.
 std::vector<uint8_t> read_file(const std::string &path) {
   std::error_code error;
   if (std::filesystem::is_directory(path, error)) {
     throw InputError("cannot read " + quoted(path) + ": it is a directory");
   }
-  if (path == "-" && stdin_taken.exchange(true)) {
-    throw InputError("standard input (-) is named twice; it holds one picture, read once");
-  }
   const auto finish = [](std::FILE *stream) { return stream == stdin ? 0 : std::fclose(stream); };
   std::unique_ptr<std::FILE, int (*)(std::FILE *)> file(
       path == "-" ? stdin : std::fopen(path.c_str(), "rb"), finish);
   if (!file) throw InputError("cannot open " + quoted(path) + ": " + system_reason());
-  // The decoder takes the length as an int.
-  const uint64_t byte_limit = std::min<uint64_t>(limits.bytes, INT_MAX);
-  const auto too_large = [&](const std::string &size) {
-    return InputError("cannot read " + quoted(path) + ": it holds " + size +
-                      " bytes, more than the " + std::to_string(byte_limit) +
-                      " that kelimg reads (--max-bytes)");
-  };
-  struct stat status;
-  if (fstat(fileno(file.get()), &status) == 0 && S_ISREG(status.st_mode) &&
-      static_cast<uint64_t>(status.st_size) > byte_limit) {
-    throw too_large(std::to_string(status.st_size));
-  }
-  constexpr size_t kFirstBytes = 1 << 16;
   std::vector<uint8_t> bytes;
-  bool start_checked = false;
   uint8_t chunk[1 << 16];
-  for (;;) {
-    const size_t got = std::fread(chunk, 1, sizeof chunk, file.get());
-    if (bytes.size() + got > byte_limit) throw too_large("more than " + std::to_string(byte_limit));
-    bytes.insert(bytes.end(), chunk, chunk + got);
-    const bool ended = got < sizeof chunk;
-    if (!start_checked && !bytes.empty() && (bytes.size() >= kFirstBytes || ended)) {
-      start_checked = true;
-      Header header;
-      if (read_header(bytes, header)) {
-        require_pixel_limit(header, path);
-      } else if (format_by_signature(bytes).empty()) {
-        throw InputError("cannot decode " + quoted(path) + ": it is not a picture in a format " +
-                         "kelimg reads (" + kFormatsIn + ")");
-      }
+  size_t got = 0;
+  while ((got = std::fread(chunk, 1, sizeof chunk, file.get())) > 0) {
+    // The decoder takes the length as an int.
+    if (bytes.size() + got > static_cast<size_t>(INT_MAX)) {
+      throw InputError(quoted(path) + " is too large to decode (2 GiB or more)");
     }
-    if (ended) break;
+    bytes.insert(bytes.end(), chunk, chunk + got);
   }
   if (std::ferror(file.get())) {
     throw InputError("cannot read " + quoted(path) + ": " + system_reason());
@@ -137,12 +63,10 @@ struct StbFree {
 };
 
 // Binary Netpbm (P5 grey, P6 colour) is looked at before the decoder sees it: this version of
-// stb ignores the largest sample value (maxval) of 8-bit files, reads 16-bit samples in the
-// machine's byte order rather than the file's, and hands back uninitialised pixels for a file
-// cut short. So a short file and a sample above maxval are refused here, and every sample is
-// scaled here from 0 .. maxval to 0 .. 255, rounding to nearest, leaving the decoder an 8-bit
-// file. Returns whether samples were 16-bit. A header that does not parse is left for the
-// decoder to report.
+// stb reads 16-bit samples in the machine's byte order rather than the file's, and hands back
+// uninitialised pixels for a file cut short. So a short file is refused here, and 16-bit samples
+// are cut to their high byte here, leaving the decoder an 8-bit file. Returns whether samples
+// were cut. A header that does not parse is left for the decoder to report.
 bool prepare_netpbm(std::vector<uint8_t> &bytes, const std::string &path) {
   const size_t size = bytes.size();
   if (size < 2 || bytes[0] != 'P' || (bytes[1] != '5' && bytes[1] != '6')) return false;
@@ -175,151 +99,47 @@ bool prepare_netpbm(std::vector<uint8_t> &bytes, const std::string &path) {
   if (size - at < samples * sample_bytes) {
     throw InputError("cannot decode " + quoted(path) + ": the file is cut short (truncated)");
   }
-  if (largest == 255) return false;
+  if (sample_bytes == 1) return false;
   const std::string header = std::string("P") + static_cast<char>(bytes[1]) + "\n" +
                              std::to_string(width) + " " + std::to_string(height) + "\n255\n";
-  std::vector<uint8_t> scaled(header.begin(), header.end());
-  scaled.resize(header.size() + samples);
-  for (uint64_t i = 0; i < samples; ++i) {
-    // Netpbm stores the high byte first.
-    const uint64_t sample = sample_bytes == 1
-                                ? bytes[at + i]
-                                : uint64_t{bytes[at + 2 * i]} << 8 | bytes[at + 2 * i + 1];
-    if (sample > largest) {
-      throw InputError("cannot decode " + quoted(path) + ": a sample of " + std::to_string(sample) +
-                       " is above the file's largest value (maxval) " + std::to_string(largest));
-    }
-    scaled[header.size() + i] = static_cast<uint8_t>((sample * 255 + largest / 2) / largest);
-  }
-  bytes.swap(scaled);
-  return sample_bytes == 2;
+  std::vector<uint8_t> reduced(header.begin(), header.end());
+  reduced.reserve(header.size() + samples);
+  // Netpbm stores the high byte first.
+  for (uint64_t i = 0; i < samples; ++i) reduced.push_back(bytes[at + 2 * i]);
+  bytes.swap(reduced);
+  return true;
 }
 
-// The decoder reads through these, so that kelimg learns when it wanted bytes past the end of
-// the file: stb then carries on with zeros, or with memory it never wrote, and hands back a
-// picture as if whole. stb refills a 128-byte buffer of its own a block at a time, so a short
-// refill is only its buffering; a refill that finds nothing, a short read into the picture's
-// memory, or a skip past the end, is the file cut short.
-class Reader {
- public:
-  explicit Reader(const std::vector<uint8_t> &bytes) : bytes_(bytes) {}
-  bool cut_short() const { return cut_short_; }
-  static const stbi_io_callbacks *callbacks() {
-    static const stbi_io_callbacks table = {read, skip, at_end};
-    return &table;
-  }
-
- private:
-  static int read(void *user, char *data, int size) {
-    Reader &reader = *static_cast<Reader *>(user);
-    if (reader.own_buffer_ == nullptr) reader.own_buffer_ = data;  // the first read is a refill
-    const size_t wanted = static_cast<size_t>(std::max(size, 0));
-    const size_t given = std::min(wanted, reader.bytes_.size() - reader.at_);
-    if (given == 0 ? wanted > 0 : (given < wanted && data != reader.own_buffer_)) {
-      reader.cut_short_ = true;
-    }
-    std::memcpy(data, reader.bytes_.data() + reader.at_, given);
-    reader.at_ += given;
-    return static_cast<int>(given);
-  }
-  static void skip(void *user, int count) {
-    Reader &reader = *static_cast<Reader *>(user);
-    const size_t left = reader.bytes_.size() - reader.at_;
-    if (count > 0 && static_cast<size_t>(count) > left) reader.cut_short_ = true;
-    reader.at_ += std::min(left, static_cast<size_t>(std::max(count, 0)));
-  }
-  static int at_end(void *user) {
-    const Reader &reader = *static_cast<Reader *>(user);
-    return reader.at_ == reader.bytes_.size() ? 1 : 0;
-  }
-
-  const std::vector<uint8_t> &bytes_;
-  size_t at_ = 0;
-  const char *own_buffer_ = nullptr;
-  bool cut_short_ = false;
-};
-
-// stb keeps the reason for its last failure and has no way to clear it, so a decoding that fails
-// without giving one would report an older failure's (a truncated JPEG said "bad png sig"). This
-// sets it to a reason of our own, to be recognised afterwards.
-const char *forget_failure_reason() {
-  const uint8_t nothing = 0;
-  int width, height, channels;
-  stbi_info_from_memory(&nothing, 0, &width, &height, &channels);
-  return stbi_failure_reason();
-}
-
-// stb's weights for grey from colour (ITU-R 601 in eighths of 256ths), so that the pictures are
-// the ones its own conversion gives.
+// Decodes to one channel; the decoder does the grey conversion itself. Samples of 16 bits keep
+// their high byte.
 template <typename Sample>
-uint32_t grey_of(const Sample *pixel) {
-  return (pixel[0] * 77u + pixel[1] * 150u + pixel[2] * 29u) >> 8;
-}
-
-// Decodes in the file's own channels, then keeps one: grey as it is, colour by stb's weights, the
-// alpha dropped. The note on stderr says what was lost, and only when something was: a palette
-// of greys is no colour, an opaque alpha channel nothing dropped. Samples of 16 bits are scaled
-// to 8, rounding to nearest, as a Netpbm file's are.
-template <typename Sample>
-Picture decode(const std::vector<uint8_t> &bytes, const std::string &path, bool was_deep) {
-  Header header;
-  const char *no_reason = forget_failure_reason();
-  const std::string format = format_by_signature(bytes);
-  const auto failure = [&](const std::string &what) {
-    const char *reason = stbi_failure_reason();
-    return InputError(
-        "cannot decode " + quoted(path) + ": " + what +
-        (reason != nullptr && reason != no_reason ? " (" + std::string(reason) + ")" : ""));
-  };
-  const std::string kind = format.empty() ? "TGA" : format;
-  const auto cut_short = [&] {
-    return InputError("cannot decode " + quoted(path) + ": the " + kind +
-                      " is cut short (truncated)");
-  };
-  Reader header_reader(bytes);
-  if (stbi_info_from_callbacks(Reader::callbacks(), &header_reader, &header.width, &header.height,
-                               &header.channels) == 0) {
-    if (header_reader.cut_short() && !format.empty()) throw cut_short();
-    throw failure(format.empty() ? "it is not a picture in a format kelimg reads (" +
-                                       std::string(kFormatsIn) + ")"
-                                 : "the " + format + " header is corrupt");
-  }
-  require_pixel_limit(header, path);
-  Reader reader(bytes);
+Picture decode(const std::vector<uint8_t> &bytes, const std::string &path, bool cut_to_8_bits) {
+  const auto length = static_cast<int>(bytes.size());
   int width = 0, height = 0, channels = 0;
   std::unique_ptr<Sample, StbFree> samples;
   if constexpr (sizeof(Sample) == 2) {
-    samples.reset(stbi_load_16_from_callbacks(Reader::callbacks(), &reader, &width, &height,
-                                              &channels, header.channels));
+    samples.reset(stbi_load_16_from_memory(bytes.data(), length, &width, &height, &channels, 1));
   } else {
-    samples.reset(stbi_load_from_callbacks(Reader::callbacks(), &reader, &width, &height, &channels,
-                                           header.channels));
+    samples.reset(stbi_load_from_memory(bytes.data(), length, &width, &height, &channels, 1));
   }
-  if (reader.cut_short()) throw cut_short();
-  if (!samples) throw failure("the " + kind + " is corrupt");
-  channels = header.channels;
+  if (!samples) {
+    const char *reason = stbi_failure_reason();
+    throw InputError("cannot decode " + quoted(path) + ": " +
+                     (reason != nullptr ? reason : "unknown format") +
+                     " (corrupt, truncated or not a picture)");
+  }
   Picture picture;
   picture.width = width;
   picture.height = height;
   picture.pixels.resize(static_cast<size_t>(picture.pixel_count()));
-  constexpr uint32_t kMax = (1u << (8 * sizeof(Sample))) - 1;
-  bool coloured = false, translucent = false;
-  const Sample *pixel = samples.get();
-  for (uint8_t &out : picture.pixels) {
-    uint32_t grey = pixel[0];
-    if (channels >= 3) {
-      coloured = coloured || pixel[1] != pixel[0] || pixel[2] != pixel[0];
-      grey = grey_of(pixel);
-    }
-    if (channels == 2 || channels == 4) translucent = translucent || pixel[channels - 1] != kMax;
-    out = static_cast<uint8_t>((grey * 255 + kMax / 2) / kMax);
-    pixel += channels;
+  for (size_t i = 0; i < picture.pixels.size(); ++i) {
+    picture.pixels[i] = static_cast<uint8_t>(samples.get()[i] >> (8 * (sizeof(Sample) - 1)));
   }
 
   std::vector<std::string> changes;
-  if (coloured) changes.push_back("colour converted to grey");
-  if (translucent) changes.push_back("alpha dropped");
-  if (sizeof(Sample) == 2 || was_deep) changes.push_back("16-bit samples reduced to 8 bits");
+  if (channels >= 3) changes.push_back("colour converted to grey");
+  if (channels == 2 || channels == 4) changes.push_back("alpha dropped");
+  if (sizeof(Sample) == 2 || cut_to_8_bits) changes.push_back("16-bit samples reduced to 8 bits");
   if (!changes.empty()) {
     std::string note = changes[0];
     for (size_t i = 1; i < changes.size(); ++i) note += ", " + changes[i];
@@ -427,18 +247,15 @@ Picture::Picture(int32_t picture_width, int32_t picture_height, uint8_t value)
       height(picture_height),
       pixels(static_cast<size_t>(int64_t{picture_width} * picture_height), value) {}
 
-void set_input_limits(const InputLimits &input_limits) {
-  limits = input_limits;
-}
-
 Picture load_picture(const std::string &path) {
   std::vector<uint8_t> bytes = read_file(path);
   if (bytes.empty()) throw InputError("cannot decode " + quoted(path) + ": the file is empty");
-  const bool was_deep = prepare_netpbm(bytes, path);
-  if (stbi_is_16_bit_from_memory(bytes.data(), static_cast<int>(bytes.size()))) {
-    return decode<uint16_t>(bytes, path, was_deep);
+  const bool cut_to_8_bits = prepare_netpbm(bytes, path);
+  const auto length = static_cast<int>(bytes.size());
+  if (stbi_is_16_bit_from_memory(bytes.data(), length)) {
+    return decode<uint16_t>(bytes, path, cut_to_8_bits);
   }
-  return decode<uint8_t>(bytes, path, was_deep);
+  return decode<uint8_t>(bytes, path, cut_to_8_bits);
 }
 
 Format output_format(const std::string &path) {

@@ -40,20 +40,8 @@ constexpr const char *kFormatsOut =
     "quality 95), chosen by the output's extension";
 constexpr int kJpegQuality = 95;
 
-// What one input may cost. A picture whose header announces more pixels is refused before it
-// is decoded, and a file of more bytes before it is read, or as soon as a stream passes the
-// limit: so a small PNG that inflates to gigabytes (a deflate bomb) or an endless stream cannot
-// take the machine's memory. Set once, before any picture is read.
-struct InputLimits {
-  uint64_t pixels = uint64_t{1} << 28;  // 268,435,456: 16384 x 16384
-  uint64_t bytes = uint64_t{1} << 30;   // 1 GiB
-};
-void set_input_limits(const InputLimits &limits);
-
-// Reads any format in kFormatsIn as 8-bit grey; "-" reads standard input, once. Colour is turned
-// grey as stb_image turns it, Netpbm samples are scaled from the file's largest value (maxval) to
-// 255 and 16-bit samples to 8 bits, rounding to nearest; a one-line note on stderr says when
-// colour, alpha or bits were lost. A file cut short, in any format, is refused.
+// Reads any format in kFormatsIn as 8-bit grey; "-" reads standard input. Colour is turned grey
+// and 16-bit samples lose their low byte, with a one-line note on stderr.
 Picture load_picture(const std::string &path);
 
 enum class Format { png, pgm, bmp, jpeg };
