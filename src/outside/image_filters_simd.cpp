@@ -48,10 +48,15 @@ hn::Vec<D> smooth(D d, hn::Vec<D> before, hn::Vec<D> centre, hn::Vec<D> after) {
 }
 
 // The high bytes of the 16-bit lanes of `lower` and then `upper`, in order: the totals >> 8 of
-// the enlargement. Highway's targets are little-endian, so a lane's high byte is its odd one.
+// the enlargement. A lane's high byte is its second in memory on little-endian CPUs and its
+// first on big-endian ones, such as s390x with Highway's four-lane portable target.
 template <class D8, class V16>
 hn::Vec<D8> high_bytes(D8 d8, V16 lower, V16 upper) {
+#if defined(__BYTE_ORDER__) && __BYTE_ORDER__ == __ORDER_BIG_ENDIAN__
+  return hn::ConcatEven(d8, hn::BitCast(d8, upper), hn::BitCast(d8, lower));
+#else
   return hn::ConcatOdd(d8, hn::BitCast(d8, upper), hn::BitCast(d8, lower));
+#endif
 }
 
 size_t SmoothTriples(const uint8_t *src, size_t count, uint8_t *dst) {
