@@ -1,12 +1,16 @@
-# Cross-compiles the library for a Cortex-M4 with Debian's arm-none-eabi toolchain. Only the
+# Cross-compiles the library for a Cortex-M with Debian's arm-none-eabi toolchain: a Cortex-M4
+# unless a toolchain file for another core sets KEL_ARM_CPU_FLAGS and includes this one. Only the
 # libraries are built: there is no C library runtime to link a program against here.
 set(CMAKE_SYSTEM_NAME Generic)
 set(CMAKE_SYSTEM_PROCESSOR arm)
 set(CMAKE_C_COMPILER arm-none-eabi-gcc)
 set(CMAKE_CXX_COMPILER arm-none-eabi-g++)
 set(CMAKE_TRY_COMPILE_TARGET_TYPE STATIC_LIBRARY)
-set(CMAKE_C_FLAGS_INIT "-mcpu=cortex-m4 -mthumb")
-set(CMAKE_CXX_FLAGS_INIT "-mcpu=cortex-m4 -mthumb -fno-exceptions -fno-rtti")
+if(NOT KEL_ARM_CPU_FLAGS)
+  set(KEL_ARM_CPU_FLAGS "-mcpu=cortex-m4 -mthumb")
+endif()
+set(CMAKE_C_FLAGS_INIT "${KEL_ARM_CPU_FLAGS}")
+set(CMAKE_CXX_FLAGS_INIT "${KEL_ARM_CPU_FLAGS} -fno-exceptions -fno-rtti")
 set(CMAKE_C_FLAGS_MINSIZEREL_INIT "-Os")
 set(CMAKE_CXX_FLAGS_MINSIZEREL_INIT "-Os")
 set(CMAKE_FIND_ROOT_PATH_MODE_PROGRAM NEVER)

@@ -153,14 +153,14 @@ inline bool starts_inside(const uint8_t *to, const uint8_t *from, size_t count) 
 KEL_ALWAYS_INLINE void run_row(Row Kernels::*entry, const Kernels &best, const uint8_t *in,
                                size_t count, uint8_t *out) {
   const size_t done = starts_inside(out, in, count) ? 0 : (best.*entry)(in, count, out);
-  (kPlainKernels.*entry)(in + done, count - done, out + done);
+  if (done < count) (kPlainKernels.*entry)(in + done, count - done, out + done);
 }
 
 template <typename Param>
 KEL_ALWAYS_INLINE void run_row(RowWith<Param> Kernels::*entry, const Kernels &best,
                                const uint8_t *in, size_t count, Param param, uint8_t *out) {
   const size_t done = starts_inside(out, in, count) ? 0 : (best.*entry)(in, count, param, out);
-  (kPlainKernels.*entry)(in + done, count - done, param, out + done);
+  if (done < count) (kPlainKernels.*entry)(in + done, count - done, param, out + done);
 }
 
 }  // namespace kel

@@ -73,10 +73,14 @@ HWY_AFTER_NAMESPACE();
 namespace kel {
 namespace simd {
 HWY_EXPORT(TargetKernels);
+
+const Kernels &chosen_kernels() {
+  return *HWY_DYNAMIC_DISPATCH(TargetKernels)();
+}
 }  // namespace simd
 
 const Kernels &kernels() {
-  return *HWY_DYNAMIC_DISPATCH(simd::TargetKernels)();
+  return simd::chosen_kernels();
 }
 
 }  // namespace kel

@@ -103,46 +103,31 @@ struct NeighbourPairs {
 // position's offset, (P01, P11) the last two of one at offset + width - 2. Both reads stay inside
 // the source: a bilinear position has x0 + 1 < W and y0 + 1 < H, so the first read ends at byte
 // (H - 1) * W + 1 at most and the second starts at byte W - 2 or later. A byte shuffle spreads
-// each pair into the halves of its lane; the one-lane fallback target takes the bytes apart.
+// each pair into the halves of its lane. Its indices are places in memory, so the halves hold the
+// same values in either byte order; taking the word apart by shifts would assume that its first
+// byte in memory is its low one, as only on little-endian CPUs. Each lane takes bytes of its own
+// word only, so the one-lane fallback target shuffles too.
 class NeighbourReader {
  public:
   NeighbourReader(D32 d, const uint8_t *src, int32_t width)
       : words_(reinterpret_cast<const int32_t *>(src)), below_(hn::Set(d, width - 2)) {
-#if HWY_TARGET != HWY_SCALAR
     // Shuffle indices count bytes from the start of each 16-byte block, four lanes to a block;
     // an index of 0x80 gives a zero byte.
     const V32 lane_start = hn::ShiftLeft<2>(hn::And(hn::Iota(d, 0), hn::Set(d, 3)));
     const V32 in_lane = hn::Or(lane_start, hn::ShiftLeft<16>(lane_start));
     first_two_ = hn::Or(in_lane, hn::Set(d, static_cast<int32_t>(0x80018000u)));
     last_two_ = hn::Or(in_lane, hn::Set(d, static_cast<int32_t>(0x80038002u)));
-#endif
   }
 
   NeighbourPairs pairs(D32 d, V32 offset) const {
     const V32 upper = hn::GatherOffset(d, words_, offset);
     const V32 lower = hn::GatherOffset(d, words_, hn::Add(offset, below_));
-#if HWY_TARGET == HWY_SCALAR
-    const V32 byte = hn::Set(d, 0xFF);
-    const V32 third_byte = hn::Set(d, 0xFF0000);
-    return {hn::Or(hn::And(upper, byte), hn::And(hn::ShiftLeft<8>(upper), third_byte)),
-            hn::Or(hn::And(hn::ShiftRight<16>(lower), byte),
-                   hn::And(hn::ShiftRight<8>(lower), third_byte))};
-#else
-    const hn::Repartition<uint8_t, D32> d8;
-    const auto spread = [&](V32 word, V32 indices) {
-      return hn::BitCast(d,
-                         hn::TableLookupBytesOr0(hn::BitCast(d8, word), hn::BitCast(d8, indices)));
-    };
-    return {spread(upper, first_two_), spread(lower, last_two_)};
-#endif
+    return {hn::TableLookupBytesOr0(upper, first_two_), hn::TableLookupBytesOr0(lower, last_two_)};
   }
 
  private:
   const int32_t *words_;
-  V32 below_;
-#if HWY_TARGET != HWY_SCALAR
-  V32 first_two_, last_two_;
-#endif
+  V32 below_, first_two_, last_two_;
 };
 
 // The bilinear total ay * top + fy * bottom, with ay = 2^14 - fy, is 2^14 * top + fy * diff for
@@ -237,15 +222,20 @@ size_t nearest_row(const LaneRun &row, int8_t *out) {
   const V32 advance_y = hn::Set(d, row.step_y * static_cast<int32_t>(lanes));
   const V32 last_read = hn::Set(d, row.width * row.height - 4);
   const V32 width = hn::Set(d, row.width);
+  // Shuffle indices as in NeighbourReader, for each lane's top byte; its other three are zeroed.
+  const V32 lane_top =
+      hn::Or(hn::ShiftLeft<26>(hn::And(hn::Iota(d, 0), hn::Set(d, 3))), hn::Set(d, 0x808080));
   const size_t count = row.count;
   size_t done = 0;
   for (; done + lanes <= count; done += lanes) {
     const V32 offset = pixel_offsets(p, width);
     const V32 read_at = hn::Min(offset, last_read);
     const V32 word = hn::GatherOffset(d, words, read_at);
-    // The pixel is byte (offset - read_at) of the word; move it to the top and sign-extend.
-    const V32 to_top = hn::Sub(hn::Set(d, 24), hn::ShiftLeft<3>(hn::Sub(offset, read_at)));
-    const V32 value = hn::ShiftRight<24>(word << to_top);
+    // The pixel is byte (offset - read_at) of the word in memory order: a byte shuffle moves it
+    // to the top, in either byte order (a shift by its number would assume little-endian), and
+    // the arithmetic shift sign-extends it.
+    const V32 pick = hn::Or(hn::ShiftLeft<24>(hn::Sub(offset, read_at)), lane_top);
+    const V32 value = hn::ShiftRight<24>(hn::TableLookupBytesOr0(word, pick));
     // -128 marks uncovered pixels, so a covered -128 is stored as -127.
     store_pixels(hn::Max(value, hn::Set(d, -127)), out + done);
     p.x = hn::Add(p.x, advance_x);
