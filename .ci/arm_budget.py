@@ -19,7 +19,7 @@ import re
 import subprocess
 import sys
 
-TEXT_BUDGET = {"kel_images": 8192, "kel_images_outside": 2048}
+TEXT_BUDGET = {"kel_images": 9216, "kel_images_outside": 2048}
 STACK_BUDGET = 1024
 # libgcc's 64-bit division and modulo: several hundred bytes each on a Cortex-M.
 WIDE_DIVISION = {"__aeabi_ldivmod", "__aeabi_uldivmod", "__divdi3", "__udivdi3", "__moddi3",
