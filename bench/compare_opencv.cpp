@@ -21,6 +21,11 @@
 #include <vector>
 
 #include "kel_images.h"
+#if KEL_USE_HIGHWAY
+#include <hwy/targets.h>
+#endif
+#include <sys/wait.h>
+#include <unistd.h>
 
 namespace {
 
@@ -442,12 +447,24 @@ void compare_drawing() {
          Goal::kFaster, 4.0);
 }
 
-}  // namespace
+// The OpenCV features above each of our instruction sets, switched off so that both sides run
+// the same instructions when the library is pinned to a narrower set.
+const char *opencv_features_above(const std::string &target) {
+  static const char kAvx512[] =
+      "AVX_512F,AVX512_COMMON,AVX512_KNL,AVX512_KNM,AVX512_SKX,AVX512_CNL,AVX512_CLX,AVX512_ICL";
+  static const char kAvx2[] =
+      "AVX,FP16,AVX2,FMA3,AVX_512F,AVX512_COMMON,AVX512_KNL,AVX512_KNM,AVX512_SKX,AVX512_CNL,"
+      "AVX512_CLX,AVX512_ICL";
+  static const char kSse4[] =
+      "SSE4_1,POPCNT,SSE4_2,AVX,FP16,AVX2,FMA3,AVX_512F,AVX512_COMMON,AVX512_KNL,AVX512_KNM,"
+      "AVX512_SKX,AVX512_CNL,AVX512_CLX,AVX512_ICL";
+  if (target == "AVX2") return kAvx512;
+  if (target == "SSE4") return kAvx2;
+  if (target == "SSSE3" || target == "EMU128" || target == "SCALAR") return kSse4;
+  return "";
+}
 
-// compare_opencv [text]: only the rows whose routine's name holds the text.
-int main(int argc, char **argv) {
-  if (argc > 1) row_filter = argv[1];
-  cv::setNumThreads(1);
+void run_tables() {
   std::printf(
       "One thread; times are microseconds per call, the median of %d batches.\n"
       "Each image routine at 640 x 480 and at 2048 x 1536; figures on 640 x 480.\n\n",
@@ -466,5 +483,67 @@ int main(int argc, char **argv) {
     compare_rotations(size);
   }
   compare_drawing();
+}
+
+}  // namespace
+
+// compare_opencv [--target NAME|all] [text]: only the rows whose routine's name holds the text;
+// with --target, the library pinned to that instruction set (all: each one this CPU has, in turn)
+// and OpenCV to the same features. OpenCV reads its switch when it loads, so a pinned run starts
+// the program again with it set.
+int main(int argc, char **argv) {
+  std::string target;
+  int arg = 1;
+  if (argc > 2 && std::strcmp(argv[1], "--target") == 0) {
+    target = argv[2];
+    arg = 3;
+  }
+  if (argc > arg) row_filter = argv[arg];
+#if KEL_USE_HIGHWAY
+  std::vector<int64_t> targets = hwy::SupportedAndGeneratedTargets();
+  if (target == "all") {
+    for (const int64_t t : targets) {
+      const pid_t child = fork();
+      if (child == 0) {
+        std::vector<char *> args = {argv[0], const_cast<char *>("--target"),
+                                    const_cast<char *>(hwy::TargetName(t))};
+        if (argc > arg) args.push_back(argv[arg]);
+        args.push_back(nullptr);
+        execv("/proc/self/exe", args.data());
+        _exit(127);
+      }
+      int status = 0;
+      waitpid(child, &status, 0);
+    }
+    return 0;
+  }
+  if (!target.empty()) {
+    int64_t chosen = 0;
+    for (const int64_t t : targets) {
+      if (target == hwy::TargetName(t)) chosen = t;
+    }
+    if (chosen == 0) {
+      std::fprintf(stderr, "compare_opencv: this CPU has no target %s\n", target.c_str());
+      return 2;
+    }
+    const char *features = opencv_features_above(target);
+    if (std::getenv("KEL_COMPARE_PINNED") == nullptr) {
+      setenv("KEL_COMPARE_PINNED", "1", 1);
+      if (*features != 0) setenv("OPENCV_CPU_DISABLE", features, 1);
+      execv("/proc/self/exe", argv);
+      return 127;
+    }
+    hwy::SetSupportedTargetsForTest(chosen);
+    std::printf("\n### %s (OpenCV without %s)\n\n", target.c_str(),
+                *features != 0 ? features : "nothing");
+  }
+#else
+  if (!target.empty()) {
+    std::fprintf(stderr, "compare_opencv: built without Highway, no target to pick\n");
+    return 2;
+  }
+#endif
+  cv::setNumThreads(1);
+  run_tables();
   return 0;
 }

@@ -2,7 +2,9 @@
  *
  * The library keeps no state, starts no threads and does no I/O. Every routine works on memory
  * the caller passes in; only kel_image_create_ex and the rotations hand out heap blocks, and
- * kel_mask_image takes scratch memory that it releases before it returns.
+ * kel_mask_image takes scratch memory that it releases before it returns. The rotations and the
+ * fill each have a heap-free twin (_into) that works in buffers the caller passes, with a call
+ * that gives their sizes.
  *
  * A plain raster is a pointer to height x width one-byte pixels, row by row, with no bytes
  * between rows; pixel (x, y) lies at offset y * width + x. The drawing routines take the column
@@ -24,6 +26,7 @@
 #ifndef KEL_IMAGES_H
 #define KEL_IMAGES_H
 
+#include <stddef.h>
 #include <stdint.h>
 
 #define KEL_IMAGES_VERSION_MAJOR 0
@@ -188,6 +191,41 @@ KEL_API void kel_image_rotate_int8_nn(const int8_t *src, int32_t height, int32_t
                                       uint8_t angle, int8_t **canvas, int32_t *canvas_height,
                                       int32_t *canvas_width, int32_t *offset_y, int32_t *offset_x);
 
+/* Heap-free rotation, for firmware without a heap or with a fragmented one. The three rotations
+ * above are exactly kel_rotation_canvas, malloc of the bytes it returns, then the matching _into
+ * call: the same canvases, sizes and offsets, and the same calls of the math library in the same
+ * order (tq_cos_ and tq_sin_ of the angle in the first, of the opposite angle in the second).
+ *
+ * kel_rotation_canvas: the canvas that a turn of a height x width source by angle needs (every
+ * rotation makes the same one; sizes are read as 64-bit values, so pass either signedness).
+ * Stores it in *canvas and returns canvas->height * canvas->width, at least 1; returns 0 and
+ * stores zeros when its sides do not fit int32_t or its byte count does not fit size_t. A null
+ * canvas is accepted (only the size is returned). */
+typedef struct kel_canvas {
+  int32_t height;   /* canvas rows */
+  int32_t width;    /* canvas columns: the row stride of the canvas buffer */
+  int32_t offset_y; /* canvas row of the source's corner (0, 0) */
+  int32_t offset_x; /* canvas column of the source's corner (0, 0) */
+} kel_canvas;
+KEL_API size_t kel_rotation_canvas(int64_t height, int64_t width, uint8_t angle,
+                                   kel_canvas *canvas);
+
+/* The rotations into a caller's buffer of `capacity` bytes, laid out as canvas->height rows of
+ * canvas->width pixels with no alignment needed: every pixel is set to the fill, then resampled
+ * as the rotation above describes. When canvas or pixels is null, a side is not positive or
+ * capacity is below height * width, nothing is written and the math library is not called. Any
+ * canvas is safe, also one that kel_rotation_canvas did not make: positions are worked in 64-bit
+ * arithmetic and only source pixels inside the source are read. Stack as the rotations. */
+KEL_API void kel_image_rotate_into(const uint8_t *src, uint32_t height, uint32_t width,
+                                   uint8_t angle, const kel_canvas *canvas, uint8_t *pixels,
+                                   size_t capacity);
+KEL_API void kel_image_rotate_int8_into(const int8_t *src, uint32_t height, uint32_t width,
+                                        uint8_t angle, const kel_canvas *canvas, int8_t *pixels,
+                                        size_t capacity);
+KEL_API void kel_image_rotate_int8_nn_into(const int8_t *src, int32_t height, int32_t width,
+                                           uint8_t angle, const kel_canvas *canvas, int8_t *pixels,
+                                           size_t capacity);
+
 /* ---------------------------------------------------------------------------------------------
  * Pixel operations and compositing
  * ------------------------------------------------------------------------------------------- */
@@ -252,6 +290,19 @@ KEL_API void kel_image_blend_image(uint8_t *dst, int32_t dst_height, int32_t dst
  * height or width writes nothing to dst; both siblings are still called, with the zero sizes. */
 KEL_API void kel_mask_image(const uint8_t *src, uint16_t height, uint16_t width,
                             const uint8_t *mask, uint8_t *dst);
+
+/* Heap-free fill. kel_mask_image_scratch_size gives the scratch bytes kel_mask_image_into needs
+ * for a height x width fill (the four buffers above and 3 bytes for aligning them; at least 1),
+ * or 0 when the fill cannot be done: a side above 65528, or a total that does not fit size_t.
+ * kel_mask_image_into is kel_mask_image with that scratch given instead of taken from malloc,
+ * any alignment: the same result and the same calls of the two siblings. When the scratch is
+ * null or smaller than the size call says, or the fill cannot be done, it returns without
+ * writing dst or the scratch and without calling either sibling. The scratch holds nothing of
+ * value afterwards. Stack as kel_mask_image. */
+KEL_API size_t kel_mask_image_scratch_size(uint16_t height, uint16_t width);
+KEL_API void kel_mask_image_into(const uint8_t *src, uint16_t height, uint16_t width,
+                                 const uint8_t *mask, uint8_t *dst, void *scratch,
+                                 size_t scratch_bytes);
 
 /* ---------------------------------------------------------------------------------------------
  * Drawing. Every pixel of a figure is clipped on its own: it is written exactly when

@@ -5,8 +5,8 @@
 #include <cstring>
 
 #include "kel_images.h"
+#include "kernels.h"
 #include "outside/kel_outside.h"
-#include "simd/pixel_ops_simd.h"
 
 namespace {
 
@@ -49,24 +49,6 @@ uint8_t blended(uint8_t target, uint8_t source) {
   return static_cast<uint8_t>((unsigned{target} + unsigned{source}) >> 1);
 }
 
-// Whether the destination range starts inside the source range, after its first byte. Only
-// then can a row operation write a source byte that it has not read yet; a destination at or
-// before the source only ever overwrites source bytes that were already read. So only then must
-// a row be done pixel by pixel; otherwise reading ahead gives the same result.
-bool starts_inside(const uint8_t *to, const uint8_t *from, size_t count) {
-  const uintptr_t to_address = reinterpret_cast<uintptr_t>(to);
-  const uintptr_t from_address = reinterpret_cast<uintptr_t>(from);
-  return to_address > from_address && to_address - from_address < count;
-}
-
-// The vector variant of a row operation where it gives the plain loop's result, else the plain
-// loop.
-template <class Row>
-Row *row_loop(Row *plain_row, Row *vector_row, const uint8_t *to, const uint8_t *from,
-              size_t count) {
-  return starts_inside(to, from, count) ? plain_row : vector_row;
-}
-
 // ---------------------------------------------------------------------------------------------
 // Paste and blend
 // ---------------------------------------------------------------------------------------------
@@ -91,7 +73,7 @@ VisibleRect visible_rect(int32_t dst_height, int32_t dst_width, uint16_t src_hei
 }
 
 // Copies count bytes with the result of d[i] = s[i] for i = 0, 1, ... in turn, for a destination
-// that starts inside the source: a forward copy that reads ahead (memmove, or the vector loop)
+// that starts inside the source: a forward copy that reads ahead (memmove, or a vector loop)
 // would differ, but repeating the first (to - from) source bytes, which copying in blocks of that
 // length does, each block's source being the previous, finished block, gives the same bytes.
 void copy_in_order(const uint8_t *from, size_t count, uint8_t *to) {
@@ -102,98 +84,40 @@ void copy_in_order(const uint8_t *from, size_t count, uint8_t *to) {
   }
 }
 
-// How a paste or a blend writes a row: without a key, and with one.
-struct RowRule {
-  kel::RowLoop opaque;
-  kel::KeyedRowLoop keyed;
-};
-
-// Paste and blend differ in their row loops: this machine's, and those that read each source
-// pixel just before writing its destination pixel, for a row whose destination starts inside its
-// source. A paste only writes its destination rows, and asks for the next one ahead.
+// How a paste or a blend writes a row, without a key and with one. A paste only writes its
+// destination rows, so it asks for the next one ahead: destination rows lie a raster row apart,
+// too far for the hardware's prefetching to follow. A blend reads its destination too, and the
+// hardware's prefetching of that read is enough.
 struct Compositing {
-  RowRule fast, in_order;
+  kel::Row kel::Kernels::*opaque;
+  kel::RowWith<uint8_t> kel::Kernels::*keyed;
   bool writes_only;
 };
 
-Compositing paste_rules(const kel::CompositeRowLoops &loops) {
-  return {
-      {loops.copy, loops.paste_with_key}, {copy_in_order, kel::plain::paste_row_with_key}, true};
-}
+constexpr Compositing kPaste{&kel::Kernels::copy, &kel::Kernels::paste_keyed, true};
+constexpr Compositing kBlend{&kel::Kernels::blend, &kel::Kernels::blend_keyed, false};
 
-Compositing blend_rules(const kel::CompositeRowLoops &loops) {
-  return {{loops.blend, loops.blend_with_key},
-          {kel::plain::blend_row, kel::plain::blend_row_with_key},
-          false};
-}
-
-// Asks for the lines of count bytes from `at` (an address, perhaps past the raster) to be
-// written. Destination rows lie a raster row apart, too far for the hardware's prefetching to
-// follow: asked for a row ahead, pasting a 400 x 300 sprite took 1.15-1.27 times a memcpy of it
-// instead of 1.36-1.49. A blend, which reads its destination too, went from 1.48-1.55 to
-// 1.60-1.78 and does not ask. Microcontrollers have no cache to fill ahead.
-void prefetch_for_writing(uintptr_t at, size_t count) {
-#if KEL_USE_HIGHWAY
-  constexpr uintptr_t kLine = 64;
-  for (uintptr_t line = at & ~(kLine - 1); line < at + count; line += kLine) {
-    __builtin_prefetch(reinterpret_cast<const void *>(line), 1, 3);
-  }
-#else
-  (void)at;
-  (void)count;
-#endif
-}
-
-// The keyed row, in one call of the keyed loop or, where the loops are plain ones, in pieces:
-// those that hold no key go as opaque rows, which copy or blend without looking at each pixel.
-#if KEL_USE_HIGHWAY
-constexpr bool kKeyedLoopsAreVectors = true;
-#else
-constexpr bool kKeyedLoopsAreVectors = false;
-#endif
-
-void keyed_row(const RowRule &rule, uint8_t *to, const uint8_t *from, size_t count,
-               uint8_t transparent, bool in_pieces) {
-  if (!in_pieces) {
-    rule.keyed(from, count, transparent, to);
-    return;
-  }
-  // Pixels looked at together: a piece without the key is done as an opaque row.
-  constexpr size_t kKeyPiece = 64;
-  for (size_t start = 0; start < count; start += kKeyPiece) {
-    const size_t piece = count - start < kKeyPiece ? count - start : kKeyPiece;
-    if (holds(from + start, piece, transparent)) {
-      rule.keyed(from + start, piece, transparent, to + start);
-    } else {
-      rule.opaque(from + start, piece, to + start);
-    }
-  }
-}
-
-// The one walker of paste and blend: clip once, then visit the visible rows top to bottom. A row
-// whose destination starts inside its source takes the in-order loops, and its keyed pixels one
-// loop.
-void composite(const Compositing &rules, uint8_t *dst, int32_t dst_height, int32_t dst_width,
+// The one walker of paste and blend: clip once, take the table once, then visit the visible rows
+// top to bottom. A row whose destination starts inside its source goes by the plain body alone.
+void composite(const Compositing &rule, uint8_t *dst, int32_t dst_height, int32_t dst_width,
                const uint8_t *src, uint16_t src_height, uint16_t src_width, int32_t x, int32_t y,
                uint16_t key) {
   const VisibleRect rect = visible_rect(dst_height, dst_width, src_height, src_width, x, y);
   if (rect.empty()) return;
+  const kel::Kernels &best = kel::kernels();
   const size_t count = static_cast<size_t>(rect.last_col - rect.first_col + 1);
   for (int64_t row = rect.first_row; row <= rect.last_row; ++row) {
     // Both offsets lie inside their rasters, which the caller sized, so they fit ptrdiff_t.
     const uint8_t *from = src + static_cast<ptrdiff_t>(row * src_width + rect.first_col);
     uint8_t *to = dst + static_cast<ptrdiff_t>((y + row) * dst_width + x + rect.first_col);
-    if (rules.writes_only) {
-      prefetch_for_writing(reinterpret_cast<uintptr_t>(to) + static_cast<uintptr_t>(dst_width),
-                           count);
+    if (rule.writes_only) {
+      best.prefetch_for_writing(reinterpret_cast<uintptr_t>(to) + static_cast<uintptr_t>(dst_width),
+                                count);
     }
-    const bool overlapping = starts_inside(to, from, count);
-    const RowRule &rule = overlapping ? rules.in_order : rules.fast;
     if (key > 255) {
-      rule.opaque(from, count, to);
+      kel::run_row(rule.opaque, best, from, count, to);
     } else {
-      keyed_row(rule, to, from, count, static_cast<uint8_t>(key),
-                !overlapping && !kKeyedLoopsAreVectors);
+      kel::run_row(rule.keyed, best, from, count, static_cast<uint8_t>(key), to);
     }
   }
 }
@@ -242,11 +166,15 @@ ColumnRange merged(ColumnRange a, ColumnRange b) {
 
 // Most mask rows hold no hole, and those that do hold it in a short stretch: memchr finds the
 // first hole at memory speed, and the last is sought backwards from the row's end.
-ColumnRange hole_columns(const uint8_t *mask_row, size_t width) {
+ColumnRange hole_columns(const kel::Kernels &row_kernels, const uint8_t *mask_row, size_t width) {
   const void *first_hole = width != 0 ? std::memchr(mask_row, 0, width) : nullptr;
   if (first_hole == nullptr) return {};
   const size_t first = static_cast<size_t>(static_cast<const uint8_t *>(first_hole) - mask_row);
-  return {first, first + kel::simd::end_of_last_zero(mask_row + first, width - first)};
+  const uint8_t *rest = mask_row + first;
+  size_t end = width - first;
+  end -= row_kernels.nonzero_tail(rest, end);
+  end -= kel::kPlainKernels.nonzero_tail(rest, end);
+  return {first, first + end};
 }
 
 // Interior columns classified together; a piece's windows and values take about 3 bytes of stack
@@ -305,6 +233,7 @@ bool look_at_windows(Extreme which, const uint8_t *mask, size_t width, size_t y,
 
 // The rasters of one fill, as the steps that visit window pieces read and write them.
 struct FillRasters {
+  const kel::Kernels &row_kernels;
   const uint8_t *src, *mask;
   uint16_t height, width;
   uint8_t *grid;
@@ -323,11 +252,11 @@ void for_each_window_piece(Extreme which, const FillRasters &fill, PieceVisit vi
   const uint8_t *const mask = fill.mask;
   const size_t height = fill.height, width = fill.width;
   if (height <= 2 || width <= 2) return;
-  ColumnRange above = hole_columns(mask, width);
-  ColumnRange row = hole_columns(mask + width, width);
+  ColumnRange above = hole_columns(fill.row_kernels, mask, width);
+  ColumnRange row = hole_columns(fill.row_kernels, mask + width, width);
   WindowPiece piece;
   for (size_t y = 1; y + 1 < height; ++y) {
-    const ColumnRange below = hole_columns(mask + (y + 1) * width, width);
+    const ColumnRange below = hole_columns(fill.row_kernels, mask + (y + 1) * width, width);
     const ColumnRange holes = merged(merged(above, row), below);
     above = row;
     row = below;
@@ -396,13 +325,13 @@ void gather_edge_values(const FillRasters &fill, size_t y, const WindowPiece &pi
 
 // Every hole pixel, edge rows and columns included, takes the enlarged surface. Only the
 // stretch of each row between its first and last hole is looked at.
-void fill_holes(const uint8_t *mask, uint16_t height, uint16_t width, const uint8_t *enlarged,
-                uint16_t enlarged_width, uint8_t *dst) {
+void fill_holes(const kel::Kernels &row_kernels, const uint8_t *mask, uint16_t height,
+                uint16_t width, const uint8_t *enlarged, uint16_t enlarged_width, uint8_t *dst) {
   for (size_t y = 0; y < height; ++y) {
     const uint8_t *mask_row = mask + y * width;
     const uint8_t *from = enlarged + y * enlarged_width;
     uint8_t *row = dst + y * width;
-    const ColumnRange holes = hole_columns(mask_row, width);
+    const ColumnRange holes = hole_columns(row_kernels, mask_row, width);
     for (size_t x = holes.first; x < holes.end; ++x) {
       row[x] = chosen(is_hole(mask_row[x]), from[x], row[x]);
     }
@@ -474,66 +403,98 @@ void dilate_until_full(uint8_t *grid, uint16_t grid_height, uint16_t grid_width,
   }
 }
 
-// a * b bytes, or null when the product does not fit size_t or malloc fails. A zero-byte
-// buffer is asked for as one byte, so that a null can only mean failure.
-uint8_t *allocate_bytes(size_t a, size_t b) {
-  if (b != 0 && a > SIZE_MAX / b) return nullptr;
-  const size_t bytes = a * b;
-  return static_cast<uint8_t *>(std::malloc(bytes != 0 ? bytes : 1));
-}
-
-// The four scratch buffers of one fill, taken in this order and released together, as hosts that
-// count or fail allocations expect. The sweeps need no second grid, so `next` stays unused.
-struct FillScratch {
-  uint8_t *enlarged = nullptr;
-  uint8_t *current = nullptr;
-  uint8_t *next = nullptr;
-  uint8_t *blurred = nullptr;
-
-  bool allocate(uint16_t height, uint16_t width, uint16_t grid_height, uint16_t grid_width,
-                uint16_t big_height, uint16_t big_width) {
-    enlarged = allocate_bytes(big_height, big_width);
-    if (enlarged != nullptr) current = allocate_bytes(grid_height, grid_width);
-    if (current != nullptr) next = allocate_bytes(grid_height, grid_width);
-    if (next != nullptr) blurred = allocate_bytes(height, width);
-    return blurred != nullptr;
-  }
-  ~FillScratch() {
-    std::free(enlarged);
-    std::free(current);
-    std::free(next);
-    std::free(blurred);
-  }
+// The sides of one fill: the source, its grid of 8 x 8 cells and the enlarged grid.
+struct FillSizes {
+  uint16_t height, width, grid_height, grid_width, big_height, big_width;
+  size_t pixels() const { return size_t{height} * width; }
+  size_t cells() const { return size_t{grid_height} * grid_width; }
+  size_t big_pixels() const { return size_t{big_height} * big_width; }
 };
 
-void fill_masked(const uint8_t *src, uint16_t height, uint16_t width, const uint8_t *mask,
-                 uint8_t *dst) {
+FillSizes fill_sizes(uint16_t height, uint16_t width) {
   const uint16_t grid_height = cells_for(height);
   const uint16_t grid_width = cells_for(width);
-  const uint16_t big_height = static_cast<uint16_t>(grid_height * kBlockSide);
-  const uint16_t big_width = static_cast<uint16_t>(grid_width * kBlockSide);
-  const size_t pixels = size_t{height} * width;
+  return {height,
+          width,
+          grid_height,
+          grid_width,
+          static_cast<uint16_t>(grid_height * kBlockSide),
+          static_cast<uint16_t>(grid_width * kBlockSide)};
+}
 
+// The four scratch buffers of one fill. The sweeps need no second grid, so `next` stays unused;
+// it is kept so that hosts that count or fail allocations see the four they always saw. The
+// enlarged raster, 64 bytes per cell, holds the sweeps' 32-bit keys until the enlargement writes
+// it, so it comes first and aligned as for uint32_t.
+struct FillScratch {
+  uint8_t *enlarged, *current, *next, *blurred;
+};
+
+// Sum of the four buffers' sizes, or 0 when it does not fit size_t (the sides are at most 65528,
+// so that happens only where size_t has 32 bits). Slack for aligning the block is included.
+size_t scratch_bytes_for(const FillSizes &s) {
+  const size_t parts[] = {s.big_pixels(), s.cells(), s.cells(), s.pixels(), alignof(uint32_t) - 1};
+  size_t total = 0;
+  for (const size_t part : parts) {
+    if (part > SIZE_MAX - total) return 0;
+    total += part;
+  }
+  return total;
+}
+
+// The four buffers carved out of one block, the first aligned for the keys.
+FillScratch carve(const FillSizes &s, void *block) {
+  const uintptr_t at = reinterpret_cast<uintptr_t>(block);
+  const uintptr_t misalignment = at % alignof(uint32_t);
+  uint8_t *start =
+      static_cast<uint8_t *>(block) + (misalignment != 0 ? alignof(uint32_t) - misalignment : 0);
   FillScratch scratch;
-  if (!scratch.allocate(height, width, grid_height, grid_width, big_height, big_width)) return;
+  scratch.enlarged = start;
+  scratch.current = scratch.enlarged + s.big_pixels();
+  scratch.next = scratch.current + s.cells();
+  scratch.blurred = scratch.next + s.cells();
+  return scratch;
+}
 
-  if (dst != src && pixels != 0) std::memcpy(dst, src, pixels);
-  std::memset(scratch.current, 0, size_t{grid_height} * grid_width);
-  const FillRasters fill{src, mask, height, width, scratch.current, grid_width, scratch.blurred,
-                         dst};
+void fill_masked(const uint8_t *src, const FillSizes &s, const uint8_t *mask, uint8_t *dst,
+                 const FillScratch &scratch) {
+  const uint16_t height = s.height, width = s.width;
+  if (dst != src && s.pixels() != 0) std::memcpy(dst, src, s.pixels());
+  std::memset(scratch.current, 0, s.cells());
+  const kel::Kernels &row_kernels = kel::kernels();
+  const FillRasters fill{row_kernels,     src, mask, height, width, scratch.current, s.grid_width,
+                         scratch.blurred, dst};
   for_each_window_piece(Extreme::kSmallest, fill, gather_edge_values);
-  // The enlarged raster, 64 bytes per cell, is not needed until the enlargement writes it: it
-  // holds the sweeps' keys meanwhile.
-  dilate_until_full(scratch.current, grid_height, grid_width,
+  dilate_until_full(scratch.current, s.grid_height, s.grid_width,
                     reinterpret_cast<uint32_t *>(scratch.enlarged));
 
-  kel_blur_uint8(scratch.current, grid_height, grid_width, scratch.current);
-  kel_scale_up_bilinear_uint8(scratch.current, grid_height, grid_width, kBlockSide,
-                              scratch.enlarged, big_height, big_width);
+  kel_blur_uint8(scratch.current, s.grid_height, s.grid_width, scratch.current);
+  kel_scale_up_bilinear_uint8(scratch.current, s.grid_height, s.grid_width, kBlockSide,
+                              scratch.enlarged, s.big_height, s.big_width);
 
-  fill_holes(mask, height, width, scratch.enlarged, big_width, dst);
+  fill_holes(row_kernels, mask, height, width, scratch.enlarged, s.big_width, dst);
   kel_blur_uint8(dst, height, width, scratch.blurred);
   for_each_window_piece(Extreme::kLargest, fill, soften_seam);
+}
+
+// n bytes from malloc; a zero-byte buffer is asked for as one byte, so that a null can only mean
+// failure.
+uint8_t *allocate_bytes(size_t n) {
+  return static_cast<uint8_t *>(std::malloc(n != 0 ? n : 1));
+}
+
+// The heap-using fill: the four buffers taken in order, each only if the one before was had, and
+// released together. Each size is a product of two 16-bit sides, so it fits size_t.
+void fill_from_heap(const uint8_t *src, const FillSizes &s, const uint8_t *mask, uint8_t *dst) {
+  FillScratch scratch{allocate_bytes(s.big_pixels()), nullptr, nullptr, nullptr};
+  if (scratch.enlarged != nullptr) scratch.current = allocate_bytes(s.cells());
+  if (scratch.current != nullptr) scratch.next = allocate_bytes(s.cells());
+  if (scratch.next != nullptr) scratch.blurred = allocate_bytes(s.pixels());
+  if (scratch.blurred != nullptr) fill_masked(src, s, mask, dst, scratch);
+  std::free(scratch.enlarged);
+  std::free(scratch.current);
+  std::free(scratch.next);
+  std::free(scratch.blurred);
 }
 
 }  // namespace
@@ -543,49 +504,64 @@ namespace plain {
 
 // Each output byte is written after the input byte at the same index was read, so the rows
 // work in place.
-void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+size_t brighten(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
   for (size_t i = 0; i < count; ++i) out[i] = brightened(in[i], percent);
+  return count;
 }
 
-void darken_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+size_t darken(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
   for (size_t i = 0; i < count; ++i) out[i] = darkened(in[i], percent);
+  return count;
+}
+
+size_t mask(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  for (size_t i = 0; i < count; ++i) out[i] = in[i] == key ? 0 : 1;
+  return count;
+}
+
+// memmove reads ahead, which gives the in-order result unless the destination starts inside
+// the source.
+size_t copy(const uint8_t *in, size_t count, uint8_t *out) {
+  if (starts_inside(out, in, count)) {
+    copy_in_order(in, count, out);
+  } else if (count != 0) {
+    std::memmove(out, in, count);
+  }
+  return count;
+}
+
+size_t blend(const uint8_t *in, size_t count, uint8_t *out) {
+  for (size_t i = 0; i < count; ++i) out[i] = blended(out[i], in[i]);
+  return count;
 }
 
 // Each source pixel is read just before its destination pixel is written.
-// memmove reads ahead, which the callers allow.
-void copy_row(const uint8_t *in, size_t count, uint8_t *out) {
-  if (count != 0) std::memmove(out, in, count);
-}
-
-void blend_row(const uint8_t *in, size_t count, uint8_t *out) {
-  for (size_t i = 0; i < count; ++i) out[i] = blended(out[i], in[i]);
-}
-
-void paste_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+size_t paste_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   for (size_t i = 0; i < count; ++i) {
     const uint8_t value = in[i];
     if (value != key) out[i] = value;
   }
+  return count;
 }
 
-void blend_row_with_key(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+size_t blend_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   for (size_t i = 0; i < count; ++i) {
     const uint8_t value = in[i];
     if (value != key) out[i] = blended(out[i], value);
   }
+  return count;
 }
 
-void mask_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  for (size_t i = 0; i < count; ++i) out[i] = in[i] == key ? 0 : 1;
-}
+// Microcontrollers have no cache to fill ahead.
+void prefetch_for_writing(uintptr_t, size_t) {}
 
 // Backwards a block at a time while the blocks hold no zero, then byte by byte.
-size_t end_of_last_zero(const uint8_t *bytes, size_t count) {
+size_t nonzero_tail(const uint8_t *bytes, size_t count) {
   constexpr size_t kBlock = 64;
   size_t end = count;
   while (end > kBlock && !holds(bytes + end - kBlock, kBlock, 0)) end -= kBlock;
   while (end > 0 && bytes[end - 1] != 0) --end;
-  return end;
+  return count - end;
 }
 
 }  // namespace plain
@@ -596,15 +572,13 @@ extern "C" {
 void kel_image_brighten(const uint8_t *src, uint32_t height, uint32_t width, uint32_t percent,
                         uint8_t *dst) {
   const uint32_t count = pixel_count(height, width);
-  row_loop(kel::plain::brighten_row, kel::simd::brighten_row, dst, src, count)(
-      src, count, clamp_percent(percent), dst);
+  kel::run_row(&kel::Kernels::brighten, kel::kernels(), src, count, clamp_percent(percent), dst);
 }
 
 void kel_image_darken(const uint8_t *src, uint32_t height, uint32_t width, uint32_t percent,
                       uint8_t *dst) {
   const uint32_t count = pixel_count(height, width);
-  row_loop(kel::plain::darken_row, kel::simd::darken_row, dst, src, count)(
-      src, count, clamp_percent(percent), dst);
+  kel::run_row(&kel::Kernels::darken, kel::kernels(), src, count, clamp_percent(percent), dst);
 }
 
 void kel_get_mask(const uint8_t *src, uint32_t height, uint32_t width, int32_t key, uint8_t *mask) {
@@ -615,28 +589,38 @@ void kel_get_mask(const uint8_t *src, uint32_t height, uint32_t width, int32_t k
     std::memset(mask, 1, count);
     return;
   }
-  row_loop(kel::plain::mask_row, kel::simd::mask_row, mask, src, count)(
-      src, count, static_cast<uint8_t>(key), mask);
+  kel::run_row(&kel::Kernels::mask, kel::kernels(), src, count, static_cast<uint8_t>(key), mask);
 }
 
 void kel_image_draw_image(uint8_t *dst, int32_t dst_height, int32_t dst_width, const uint8_t *src,
                           uint16_t src_height, uint16_t src_width, int32_t x, int32_t y,
                           uint16_t key) {
-  composite(paste_rules(kel::simd::composite_row_loops()), dst, dst_height, dst_width, src,
-            src_height, src_width, x, y, key);
+  composite(kPaste, dst, dst_height, dst_width, src, src_height, src_width, x, y, key);
 }
 
 void kel_image_blend_image(uint8_t *dst, int32_t dst_height, int32_t dst_width, const uint8_t *src,
                            uint16_t src_height, uint16_t src_width, int32_t x, int32_t y,
                            uint16_t key) {
-  composite(blend_rules(kel::simd::composite_row_loops()), dst, dst_height, dst_width, src,
-            src_height, src_width, x, y, key);
+  composite(kBlend, dst, dst_height, dst_width, src, src_height, src_width, x, y, key);
 }
 
 void kel_mask_image(const uint8_t *src, uint16_t height, uint16_t width, const uint8_t *mask,
                     uint8_t *dst) {
   if (height > kMaxFillSide || width > kMaxFillSide) return;
-  fill_masked(src, height, width, mask, dst);
+  fill_from_heap(src, fill_sizes(height, width), mask, dst);
+}
+
+size_t kel_mask_image_scratch_size(uint16_t height, uint16_t width) {
+  if (height > kMaxFillSide || width > kMaxFillSide) return 0;
+  return scratch_bytes_for(fill_sizes(height, width));
+}
+
+void kel_mask_image_into(const uint8_t *src, uint16_t height, uint16_t width, const uint8_t *mask,
+                         uint8_t *dst, void *scratch, size_t scratch_bytes) {
+  const size_t needed = kel_mask_image_scratch_size(height, width);
+  if (needed == 0 || scratch == nullptr || scratch_bytes < needed) return;
+  const FillSizes sizes = fill_sizes(height, width);
+  fill_masked(src, sizes, mask, dst, carve(sizes, scratch));
 }
 
 }  // extern "C"

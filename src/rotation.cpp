@@ -6,11 +6,9 @@
 #include <cstring>
 
 #include "kel_images.h"
+#include "kernels.h"
 #include "outside/kel_outside.h"
 #include "wide_division.h"
-#if KEL_USE_HIGHWAY
-#include "simd/rotation_simd.h"
-#endif
 
 namespace {
 
@@ -133,10 +131,11 @@ int64_t bilinear_total(const Source<Pixel> &src, int64_t x0, int64_t y0, int32_t
 }
 
 // The three resamplings. kReach is how many columns (and rows) past the position's whole part
-// are read: a position is resampled only when its whole part lies in [0, side - kReach).
-// resample_run hands a run of a row to the vector variant, which does the first pixels of it.
+// are read: a position is resampled only when its whole part lies in [0, side - kReach). kRun is
+// the kernel that resamples a run of a canvas row.
 struct UnsignedBilinear {
   using Pixel = uint8_t;
+  static constexpr kel::RotationRow<Pixel> kel::Kernels::*kRun = &kel::Kernels::rotate_u8;
   static constexpr uint8_t kFill = 255;
   static constexpr int64_t kReach = 1;
   static uint8_t resample(const Source<uint8_t> &src, int64_t x0, int64_t y0, int32_t fx,
@@ -144,15 +143,11 @@ struct UnsignedBilinear {
     // Never negative, so the shift is the truncating division by 2^28.
     return static_cast<uint8_t>(bilinear_total(src, x0, y0, fx, fy) >> 28);
   }
-#if KEL_USE_HIGHWAY
-  static size_t resample_run(const kel::simd::RotationRow &row, uint8_t *out) {
-    return kel::simd::rotate_row_bilinear(row, out);
-  }
-#endif
 };
 
 struct SignedBilinear {
   using Pixel = int8_t;
+  static constexpr kel::RotationRow<Pixel> kel::Kernels::*kRun = &kel::Kernels::rotate_i8;
   static constexpr int8_t kFill = 0;
   static constexpr int64_t kReach = 1;
   static int8_t resample(const Source<int8_t> &src, int64_t x0, int64_t y0, int32_t fx,
@@ -162,15 +157,11 @@ struct SignedBilinear {
     const int64_t toward_zero = total < 0 ? total + ((int64_t{1} << 28) - 1) : total;
     return static_cast<int8_t>(toward_zero >> 28);
   }
-#if KEL_USE_HIGHWAY
-  static size_t resample_run(const kel::simd::RotationRow &row, int8_t *out) {
-    return kel::simd::rotate_row_bilinear(row, out);
-  }
-#endif
 };
 
 struct SignedNearest {
   using Pixel = int8_t;
+  static constexpr kel::RotationRow<Pixel> kel::Kernels::*kRun = &kel::Kernels::rotate_i8_nn;
   static constexpr int8_t kFill = -128;
   static constexpr int64_t kReach = 0;
   static int8_t resample(const Source<int8_t> &src, int64_t x, int64_t y, int32_t, int32_t) {
@@ -178,49 +169,7 @@ struct SignedNearest {
     const int32_t value = src.at(x, y);
     return static_cast<int8_t>(value == -128 ? -127 : value);
   }
-#if KEL_USE_HIGHWAY
-  static size_t resample_run(const kel::simd::RotationRow &row, int8_t *out) {
-    return kel::simd::rotate_row_nearest(row, out);
-  }
-#endif
 };
-
-// The canvas, every pixel set to the fill; null when malloc fails.
-void *allocate_canvas(size_t bytes, uint8_t fill) {
-  // Taken back through a volatile so that no compiler merges this malloc and a fill of 0 into
-  // calloc: the header promises malloc, and hosts that count on it may provide no calloc.
-  void *volatile fresh = std::malloc(bytes);
-  void *block = fresh;
-  if (block != nullptr) std::memset(block, fill, bytes);
-  return block;
-}
-
-// A new canvas for the turn by angle, its geometry and the opposite turn that maps it back.
-struct Canvas {
-  void *pixels;
-  CanvasGeometry geometry;
-  Turn opposite;
-};
-
-// Canvas geometry, allocation and fill. The four sizes and offsets are written before any pixel is
-// resampled; when no canvas can be made they are 0 and the opposite turn is not asked for.
-Canvas new_canvas(int64_t height, int64_t width, uint8_t angle, uint8_t fill,
-                  int32_t *canvas_height, int32_t *canvas_width, int32_t *offset_y,
-                  int32_t *offset_x) {
-  Canvas c{nullptr, turned_canvas(height, width, turn_by(angle)), {0, 0}};
-  const CanvasGeometry &g = c.geometry;
-  if (!representable(g)) {
-    *canvas_height = *canvas_width = *offset_y = *offset_x = 0;
-    return c;
-  }
-  c.pixels = allocate_canvas(static_cast<size_t>(g.height) * static_cast<size_t>(g.width), fill);
-  *canvas_height = static_cast<int32_t>(g.height);
-  *canvas_width = static_cast<int32_t>(g.width);
-  *offset_y = static_cast<int32_t>(g.offset_y);
-  *offset_x = static_cast<int32_t>(g.offset_x);
-  if (c.pixels != nullptr) c.opposite = turn_by(static_cast<uint8_t>(-angle & 255));
-  return c;
-}
 
 // The columns [first, last) of canvas row r whose position, mapped back through the opposite
 // turn b, has a whole part in [0, side - reach) on both axes, and the position of column first.
@@ -241,85 +190,172 @@ RowRun row_run(const CanvasGeometry &g, Turn b, int64_t r, int64_t x_high, int64
   return {first, last, sx0 + int64_t{b.cos} * first, sy0 + int64_t{b.sin} * first};
 }
 
-// Maps every canvas pixel back through the opposite turn and resamples the source there. Each
-// row visits only its run of columns inside the source; pixels outside keep the fill. Stepping is
-// exact integer algebra, so the positions equal those computed afresh.
+// A run of a canvas row, resampled pixel by pixel. Stepping is exact integer algebra, so the
+// positions equal those computed afresh.
 template <typename Policy>
-void resample_canvas(const Source<typename Policy::Pixel> &src, const CanvasGeometry &g, Turn b,
-                     typename Policy::Pixel *canvas) {
-  // A whole part in [0, side - kReach) is a fixed-point position in [0, (side - kReach) * 16384).
-  const int64_t x_high = (src.width - Policy::kReach) * kOne;
-  const int64_t y_high = (src.height - Policy::kReach) * kOne;
-#if KEL_USE_HIGHWAY
-  // The vector variants work in 32-bit lanes: positions inside a source below 2^16 on each side
-  // stay below 2^30, and byte offsets below 2^31. The nearest one reads 4 bytes at a time.
-  const bool vectors = src.width < (1 << 16) && src.height < (1 << 16) &&
-                       src.width * src.height < (int64_t{1} << 31) && src.width * src.height >= 4;
-#endif
-  for (int64_t r = 0; r < g.height; ++r) {
-    RowRun run = row_run(g, b, r, x_high, y_high);
-    if (run.first >= run.last) continue;
-    typename Policy::Pixel *out = canvas + static_cast<size_t>(r) * static_cast<size_t>(g.width);
-#if KEL_USE_HIGHWAY
-    if (vectors) {
-      const kel::simd::RotationRow row{src.pixels,
-                                       static_cast<int32_t>(src.height),
-                                       static_cast<int32_t>(src.width),
-                                       static_cast<int32_t>(run.x),
-                                       static_cast<int32_t>(run.y),
-                                       b.cos,
-                                       b.sin,
-                                       static_cast<size_t>(run.last - run.first)};
-      const auto done = static_cast<int64_t>(Policy::resample_run(row, out + run.first));
-      run.first += done;
-      run.x += b.cos * done;
-      run.y += b.sin * done;
-    }
-#endif
-    for (; run.first < run.last; ++run.first, run.x += b.cos, run.y += b.sin) {
-      out[run.first] = Policy::resample(src, run.x >> kFractionBits, run.y >> kFractionBits,
-                                        static_cast<int32_t>(run.x & kFractionMask),
-                                        static_cast<int32_t>(run.y & kFractionMask));
-    }
+size_t resample_run(const kel::RotationRun &run, typename Policy::Pixel *out) {
+  using Pixel = typename Policy::Pixel;
+  const Source<Pixel> src{static_cast<const Pixel *>(run.src), run.height, run.width};
+  int64_t x = run.x, y = run.y;
+  for (size_t i = 0; i < run.count; ++i, x += run.step_x, y += run.step_y) {
+    out[i] = Policy::resample(src, x >> kFractionBits, y >> kFractionBits,
+                              static_cast<int32_t>(x & kFractionMask),
+                              static_cast<int32_t>(y & kFractionMask));
   }
+  return run.count;
+}
+
+// What the canvas walk needs of a resampling, without its pixel type: one walk, one fill and one
+// allocation then serve all three rotations.
+struct Resampling {
+  uint8_t fill;   // the fill's byte
+  int64_t reach;  // Policy::kReach
+  // Resamples a run on the chosen table, the plain body finishing it.
+  void (*run)(const kel::Kernels &chosen, kel::RotationRun run, void *out);
+};
+
+template <typename Policy>
+void run_on(const kel::Kernels &chosen, kel::RotationRun run, void *out) {
+  auto *pixels = static_cast<typename Policy::Pixel *>(out);
+  const size_t done = (chosen.*Policy::kRun)(run, pixels);
+  run.x += int64_t{run.step_x} * static_cast<int64_t>(done);
+  run.y += int64_t{run.step_y} * static_cast<int64_t>(done);
+  run.count -= done;
+  (kel::kPlainKernels.*Policy::kRun)(run, pixels + done);
 }
 
 template <typename Policy>
-void rotate(const typename Policy::Pixel *pixels, int64_t height, int64_t width, uint8_t angle,
-            typename Policy::Pixel **canvas, int32_t *canvas_height, int32_t *canvas_width,
-            int32_t *offset_y, int32_t *offset_x) {
-  using Pixel = typename Policy::Pixel;
-  const Canvas c = new_canvas(height, width, angle, static_cast<uint8_t>(Policy::kFill),
-                              canvas_height, canvas_width, offset_y, offset_x);
-  *canvas = static_cast<Pixel *>(c.pixels);
-  if (c.pixels == nullptr) return;
-  resample_canvas<Policy>(Source<Pixel>{pixels, height, width}, c.geometry, c.opposite,
-                          static_cast<Pixel *>(c.pixels));
+constexpr Resampling kResampling{static_cast<uint8_t>(Policy::kFill), Policy::kReach,
+                                 run_on<Policy>};
+
+// Maps every canvas pixel back through the opposite turn and resamples the source there. Each
+// row visits only its run of columns inside the source, on the chosen table; pixels outside keep
+// the fill.
+void resample_canvas(const Resampling &how, const void *src, int64_t height, int64_t width,
+                     const CanvasGeometry &g, Turn b, uint8_t *canvas) {
+  // A whole part in [0, side - reach) is a fixed-point position in [0, (side - reach) * 16384).
+  const int64_t x_high = (width - how.reach) * kOne;
+  const int64_t y_high = (height - how.reach) * kOne;
+  const kel::Kernels &chosen = kel::kernels();
+  for (int64_t r = 0; r < g.height; ++r) {
+    const RowRun columns = row_run(g, b, r, x_high, y_high);
+    if (columns.first >= columns.last) continue;
+    uint8_t *out = canvas + static_cast<size_t>(r) * static_cast<size_t>(g.width) +
+                   static_cast<size_t>(columns.first);
+    how.run(chosen,
+            {src, height, width, columns.x, columns.y, b.cos, b.sin,
+             static_cast<size_t>(columns.last - columns.first)},
+            out);
+  }
+}
+
+// The canvas geometry that a turn by angle asks for, and its byte count; 0 bytes when its sides do
+// not fit int32_t or its byte count does not fit size_t (sides are never below 1).
+size_t canvas_for(int64_t height, int64_t width, uint8_t angle, kel_canvas &canvas) {
+  const CanvasGeometry g = turned_canvas(height, width, turn_by(angle));
+  if (!representable(g)) {
+    canvas = kel_canvas{0, 0, 0, 0};
+    return 0;
+  }
+  canvas = kel_canvas{static_cast<int32_t>(g.height), static_cast<int32_t>(g.width),
+                      static_cast<int32_t>(g.offset_y), static_cast<int32_t>(g.offset_x)};
+  return static_cast<size_t>(g.height) * static_cast<size_t>(g.width);
+}
+
+// Fills and resamples a canvas the caller holds. Any geometry is safe: positions are worked in
+// 64 bits and only those inside the source are read; a buffer smaller than the geometry's sides
+// (or no geometry) leaves everything untouched and asks the math library for nothing.
+void rotate_into(const Resampling &how, const void *src, int64_t height, int64_t width,
+                 uint8_t angle, const kel_canvas *canvas, void *out, size_t capacity) {
+  if (canvas == nullptr || out == nullptr || canvas->height <= 0 || canvas->width <= 0) return;
+  const CanvasGeometry g{canvas->height, canvas->width, canvas->offset_y, canvas->offset_x};
+  if (static_cast<uint64_t>(g.height) * static_cast<uint64_t>(g.width) > capacity) return;
+  std::memset(out, how.fill, static_cast<size_t>(g.height) * static_cast<size_t>(g.width));
+  const Turn opposite = turn_by(static_cast<uint8_t>(-angle & 255));
+  resample_canvas(how, src, height, width, g, opposite, static_cast<uint8_t *>(out));
+}
+
+// The heap-using rotation: the geometry, a canvas from malloc, then the rotation into it; returns
+// the canvas. The four sizes and offsets are written before any pixel is resampled; when no
+// canvas can be made they are 0 and the opposite turn is not asked for.
+void *rotate(const Resampling &how, const void *src, int64_t height, int64_t width, uint8_t angle,
+             int32_t *canvas_height, int32_t *canvas_width, int32_t *offset_y, int32_t *offset_x) {
+  kel_canvas geometry;
+  const size_t bytes = canvas_for(height, width, angle, geometry);
+  *canvas_height = geometry.height;
+  *canvas_width = geometry.width;
+  *offset_y = geometry.offset_y;
+  *offset_x = geometry.offset_x;
+  if (bytes == 0) return nullptr;
+  // Taken back through a volatile so that no compiler merges this malloc and the fill into
+  // calloc: the header promises malloc, and hosts that count on it may provide no calloc.
+  void *volatile fresh = std::malloc(bytes);
+  void *block = fresh;
+  if (block != nullptr) rotate_into(how, src, height, width, angle, &geometry, block, bytes);
+  return block;
 }
 
 }  // namespace
 
+namespace kel {
+namespace plain {
+
+size_t rotate_u8(const RotationRun &run, uint8_t *out) {
+  return resample_run<UnsignedBilinear>(run, out);
+}
+
+size_t rotate_i8(const RotationRun &run, int8_t *out) {
+  return resample_run<SignedBilinear>(run, out);
+}
+
+size_t rotate_i8_nn(const RotationRun &run, int8_t *out) {
+  return resample_run<SignedNearest>(run, out);
+}
+
+}  // namespace plain
+}  // namespace kel
+
 extern "C" {
+
+size_t kel_rotation_canvas(int64_t height, int64_t width, uint8_t angle, kel_canvas *canvas) {
+  kel_canvas ignored;
+  return canvas_for(height, width, angle, canvas != nullptr ? *canvas : ignored);
+}
+
+void kel_image_rotate_into(const uint8_t *src, uint32_t height, uint32_t width, uint8_t angle,
+                           const kel_canvas *canvas, uint8_t *pixels, size_t capacity) {
+  rotate_into(kResampling<UnsignedBilinear>, src, height, width, angle, canvas, pixels, capacity);
+}
+
+void kel_image_rotate_int8_into(const int8_t *src, uint32_t height, uint32_t width, uint8_t angle,
+                                const kel_canvas *canvas, int8_t *pixels, size_t capacity) {
+  rotate_into(kResampling<SignedBilinear>, src, height, width, angle, canvas, pixels, capacity);
+}
+
+void kel_image_rotate_int8_nn_into(const int8_t *src, int32_t height, int32_t width, uint8_t angle,
+                                   const kel_canvas *canvas, int8_t *pixels, size_t capacity) {
+  rotate_into(kResampling<SignedNearest>, src, height, width, angle, canvas, pixels, capacity);
+}
 
 void kel_image_rotate(const uint8_t *src, uint32_t height, uint32_t width, uint8_t angle,
                       uint8_t **canvas, int32_t *canvas_height, int32_t *canvas_width,
                       int32_t *offset_y, int32_t *offset_x) {
-  rotate<UnsignedBilinear>(src, height, width, angle, canvas, canvas_height, canvas_width, offset_y,
-                           offset_x);
+  *canvas = static_cast<uint8_t *>(rotate(kResampling<UnsignedBilinear>, src, height, width, angle,
+                                          canvas_height, canvas_width, offset_y, offset_x));
 }
 
 void kel_image_rotate_int8(const int8_t *src, uint32_t height, uint32_t width, uint8_t angle,
                            int8_t **canvas, int32_t *canvas_height, int32_t *canvas_width,
                            int32_t *offset_y, int32_t *offset_x) {
-  rotate<SignedBilinear>(src, height, width, angle, canvas, canvas_height, canvas_width, offset_y,
-                         offset_x);
+  *canvas = static_cast<int8_t *>(rotate(kResampling<SignedBilinear>, src, height, width, angle,
+                                         canvas_height, canvas_width, offset_y, offset_x));
 }
 
 void kel_image_rotate_int8_nn(const int8_t *src, int32_t height, int32_t width, uint8_t angle,
                               int8_t **canvas, int32_t *canvas_height, int32_t *canvas_width,
                               int32_t *offset_y, int32_t *offset_x) {
-  rotate<SignedNearest>(src, height, width, angle, canvas, canvas_height, canvas_width, offset_y,
-                        offset_x);
+  *canvas = static_cast<int8_t *>(rotate(kResampling<SignedNearest>, src, height, width, angle,
+                                         canvas_height, canvas_width, offset_y, offset_x));
 }
 
 }  // extern "C"

@@ -6,65 +6,27 @@
 #include <cstring>
 
 #include "kel_images.h"
+#include "kernels.h"
 #include "outside/kel_outside.h"
-#include "simd/statistics_simd.h"
 
 namespace kel {
 namespace plain {
 
-#if KEL_USE_HIGHWAY
-// A run of one value would make every increment wait for the store of the one before, so
-// consecutive pixels go to four histograms in turn -- the caller's and three on the stack (3 KiB
-// at most) -- that are summed at the end. Eight pixels are read as one word, so the stores to
-// the histograms never have to be checked against the next pixels' loads; which byte of the
-// word goes to which histogram does not change the sums. Written out by hand, as compilers do
-// not unroll the lanes at -O2.
-void count_top_bits(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *hist) {
+size_t count_bins(const uint8_t *pixels, size_t count, uint32_t bits, uint32_t *hist) {
   const uint32_t shift = 8 - bits;
-  const uint32_t bins = uint32_t{1} << bits;
-  uint32_t lane1[256], lane2[256], lane3[256];
-  for (uint32_t bin = 0; bin < bins; ++bin) hist[bin] = lane1[bin] = lane2[bin] = lane3[bin] = 0;
-
-  const auto bin_of = [shift](uint64_t word, unsigned byte) {
-    return static_cast<uint32_t>((word >> (8 * byte)) & 0xFF) >> shift;
-  };
-  uint32_t i = 0;
-  for (; count - i >= 8; i += 8) {
-    uint64_t word;
-    std::memcpy(&word, pixels + i, sizeof word);
-    ++hist[bin_of(word, 0)];
-    ++lane1[bin_of(word, 1)];
-    ++lane2[bin_of(word, 2)];
-    ++lane3[bin_of(word, 3)];
-    ++hist[bin_of(word, 4)];
-    ++lane1[bin_of(word, 5)];
-    ++lane2[bin_of(word, 6)];
-    ++lane3[bin_of(word, 7)];
-  }
-  for (; i < count; ++i) ++hist[pixels[i] >> shift];
-
-  // No bin can overflow: count is below 2^31.
-  for (uint32_t bin = 0; bin < bins; ++bin) hist[bin] += lane1[bin] + lane2[bin] + lane3[bin];
+  for (size_t i = 0; i < count; ++i) ++hist[pixels[i] >> shift];
+  return count;
 }
-#else
-// Without the vector variants, as on microcontrollers whose whole stack may be a few KiB, the
-// three extra histograms above would be the largest stack of the library: one count per pixel,
-// straight into the caller's bins.
-void count_top_bits(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *hist) {
-  const uint32_t shift = 8 - bits;
-  std::memset(hist, 0, sizeof *hist << bits);
-  for (uint32_t i = 0; i < count; ++i) ++hist[pixels[i] >> shift];
-}
-#endif
 
-PixelSums pixel_sums(const uint8_t *pixels, uint32_t count) {
-  PixelSums sums{0, 0};
-  for (uint32_t i = 0; i < count; ++i) {
+size_t sum_pixels(const uint8_t *pixels, size_t count, PixelSums *sums) {
+  uint32_t sum = sums->sum, sum_of_squares = sums->sum_of_squares;
+  for (size_t i = 0; i < count; ++i) {
     const uint32_t value = pixels[i];
-    sums.sum += value;
-    sums.sum_of_squares += value * value;
+    sum += value;
+    sum_of_squares += value * value;
   }
-  return sums;
+  *sums = PixelSums{sum, sum_of_squares};
+  return count;
 }
 
 }  // namespace plain
@@ -87,23 +49,18 @@ uint32_t pixels_to_visit(uint32_t area) {
   return area <= uint32_t{INT32_MAX} ? area : 0;
 }
 
-// Counts with the vector variant where there is one for this many bins.
+// Clears hist[0 .. 2^bits) and counts the top `bits` bits of n pixels into it.
 void count_pixels(const uint8_t *src, uint32_t n, uint32_t bits, uint32_t *hist) {
-#if KEL_USE_HIGHWAY
-  if (bits <= kel::kMostVectorBinBits) {
-    kel::simd::count_top_bits(src, n, bits, hist);
-    return;
-  }
-#endif
-  kel::plain::count_top_bits(src, n, bits, hist);
+  std::memset(hist, 0, sizeof *hist << bits);
+  const size_t done = kel::kernels().count_bins(src, n, bits, hist);
+  kel::kPlainKernels.count_bins(src + done, n - done, bits, hist);
 }
 
 kel::PixelSums sum_pixels(const uint8_t *src, uint32_t n) {
-#if KEL_USE_HIGHWAY
-  return kel::simd::pixel_sums(src, n);
-#else
-  return kel::plain::pixel_sums(src, n);
-#endif
+  kel::PixelSums sums{0, 0};
+  const size_t done = kel::kernels().sum_pixels(src, n, &sums);
+  kel::kPlainKernels.sum_pixels(src + done, n - done, &sums);
+  return sums;
 }
 
 // floor(sqrt(variance)). tq_sqrt_24_5 reads v << 18 as v / 64 and returns its root with five

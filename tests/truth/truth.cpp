@@ -274,6 +274,49 @@ void hstat(Call &c) {
   c.t.nums("mean var std", v, 3);
 }
 
+// Whether the heap-free rotations, into a buffer one byte larger than asked whose last byte must
+// stay untouched, give the canvases and geometry the heap-using ones gave.
+bool same_as_heap_free(const Call &c, const Raster &r, uint8_t *const canvas[3],
+                       const int32_t g[3][4]) {
+  kel_canvas geometry;
+  const size_t bytes =
+      kel_rotation_canvas(c.a[0] & 0xFFFFFFFF, c.a[1] & 0xFFFFFFFF, c.u8(2), &geometry);
+  if (bytes == 0) return canvas[0] == nullptr && g[0][0] == 0 && g[0][1] == 0;
+  uint8_t *pixels = static_cast<uint8_t *>(malloc(bytes + 1));
+  if (pixels == nullptr) return true;  // nothing to compare with
+  const auto *signed_src = reinterpret_cast<const int8_t *>(r.data());
+  auto *signed_pixels = reinterpret_cast<int8_t *>(pixels);
+  bool same = true;
+  for (int kind = 0; kind < 2; ++kind) {
+    pixels[bytes] = 0xA5;
+    if (kind == 0)
+      kel_image_rotate_into(r.data(), c.u(0), c.u(1), c.u8(2), &geometry, pixels, bytes);
+    if (kind == 1) {
+      kel_image_rotate_int8_into(signed_src, c.u(0), c.u(1), c.u8(2), &geometry, signed_pixels,
+                                 bytes);
+    }
+    same = same && canvas[kind] != nullptr && pixels[bytes] == 0xA5 &&
+           !memcmp(pixels, canvas[kind], bytes) && geometry.height == g[kind][0] &&
+           geometry.width == g[kind][1] && geometry.offset_y == g[kind][2] &&
+           geometry.offset_x == g[kind][3];
+  }
+  free(pixels);
+  // The nearest-neighbour rotation reads its sizes as signed; its canvas may differ in size.
+  const size_t nn_bytes = kel_rotation_canvas(c.i(0), c.i(1), c.u8(2), &geometry);
+  pixels = static_cast<uint8_t *>(malloc(nn_bytes + 1));
+  if (nn_bytes == 0 || pixels == nullptr) {
+    free(pixels);
+    return same && (nn_bytes != 0 || canvas[2] == nullptr);
+  }
+  pixels[nn_bytes] = 0xA5;
+  kel_image_rotate_int8_nn_into(signed_src, c.i(0), c.i(1), c.u8(2), &geometry,
+                                reinterpret_cast<int8_t *>(pixels), nn_bytes);
+  same = same && canvas[2] != nullptr && pixels[nn_bytes] == 0xA5 &&
+         !memcmp(pixels, canvas[2], nn_bytes);
+  free(pixels);
+  return same;
+}
+
 // rotate <raster> h w angle: the three rotations of the same bytes (read as signed for the
 // int8 ones), each canvas with its size, the source corner's position and whether it was made.
 void rotate(Call &c) {
@@ -307,8 +350,9 @@ void rotate(Call &c) {
   }
   for (int kind = 0; kind < 3; ++kind) {
     if (canvas[kind] && !alike) render(c.t, canvas[kind], g[kind][0], g[kind][1], kind > 0);
-    free(canvas[kind]);
   }
+  if (!same_as_heap_free(c, r, canvas, g)) c.t.put("heap-free rotation differs\n");
+  for (uint8_t *made : canvas) free(made);
   if (!r.guards_intact()) c.t.put("guard bytes written\n");
 }
 
@@ -348,8 +392,23 @@ void fill(Call &c) {
   Raster src(c.s[0], c.a[0], c.a[1]), mask(c.s[1], c.a[0], c.a[1]),
       dst(Spec{'c', 77}, c.a[0], c.a[1]);
   Raster &out = c.n > 2 ? src : dst;
+  // The heap-free twin on copies of the same inputs, from a scratch block one byte off its
+  // alignment, must give the same bytes.
+  Raster twin_src(c.s[0], c.a[0], c.a[1]), twin_dst(Spec{'c', 77}, c.a[0], c.a[1]);
+  Raster &twin_out = c.n > 2 ? twin_src : twin_dst;
+  const size_t scratch_bytes = kel_mask_image_scratch_size(c.u16(0), c.u16(1));
+  auto *scratch = static_cast<uint8_t *>(malloc(scratch_bytes + 1));
+  const bool twin_made = scratch != nullptr;
+  if (twin_made) {
+    kel_mask_image_into(twin_src.data(), c.u16(0), c.u16(1), mask.data(), twin_out.data(),
+                        scratch + 1, scratch_bytes);
+  }
+  free(scratch);
   kel_mask_image(src.data(), c.u16(0), c.u16(1), mask.data(), out.data());
   render(c.t, out);
+  if (twin_made && memcmp(twin_out.data(), out.data(), out.n)) {
+    c.t.put("heap-free fill differs\n");
+  }
 }
 
 // Drawings: <background> h w, then the routine's own arguments, colour last.

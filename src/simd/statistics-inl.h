@@ -1,13 +1,19 @@
-// Vector variants of the statistics' pixel loops, compiled once per instruction set and picked
-// at run time. The plain loops in statistics.cpp are the reference they are tested against.
-#undef HWY_TARGET_INCLUDE
-#define HWY_TARGET_INCLUDE "simd/statistics_simd.cpp"
-#include "simd/statistics_simd.h"
+// Vector variants of the statistics' pixel loops, compiled once per instruction set through
+// simd/kernels_simd.cpp. Each does the first pixels of its run and returns how many; the plain
+// body finishes the run.
+#if defined(KEL_SIMD_STATISTICS_INL_H_) == defined(HWY_TARGET_TOGGLE)
+#ifdef KEL_SIMD_STATISTICS_INL_H_
+#undef KEL_SIMD_STATISTICS_INL_H_
+#else
+#define KEL_SIMD_STATISTICS_INL_H_
+#endif
 
-#include <hwy/foreach_target.h>  // must come before highway.h
 #include <hwy/highway.h>
 
 #include <cstdint>
+#include <cstring>
+
+#include "kernels.h"
 
 HWY_BEFORE_NAMESPACE();
 namespace kel {
@@ -33,20 +39,22 @@ uint64_t sum_of_lanes(D d, hn::Vec<D> v) {
   return hn::GetLane(hn::SumOfLanes(d, v));
 }
 
+// The most bins the comparing count below takes; wider histograms count pixel by pixel.
+constexpr uint32_t kMostVectorBinBits = 4;
+
 // The bin of a pixel is its top bits, so comparing the pixel's top bits (the rest masked off)
 // with each bin's lowest value finds it. Each bin keeps one counter per byte lane, which
 // subtracts the all-ones lanes of its comparison; a counter reaches at most 255 before it is
-// summed into the bin's total.
+// added to the bin. Counts whole vectors and returns how many pixels they held.
 template <uint32_t kBins>
-void count_bins(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *hist) {
+size_t count_bins(const uint8_t *pixels, size_t count, uint32_t bits, uint32_t *hist) {
+#if KEL_STATISTICS_VECTORS
   const D8 d;
   const hn::Repartition<uint64_t, D8> d64;
   const size_t lanes = hn::Lanes(d);
   const uint32_t shift = 8 - bits;
   const V8 top_mask = hn::Set(d, static_cast<uint8_t>(0xFF00u >> bits));
-  uint32_t totals[kBins] = {};
   size_t i = 0;
-#if KEL_STATISTICS_VECTORS
   while (count - i >= lanes) {
     const size_t vectors =
         (count - i) / lanes < kByteCounterVectors ? (count - i) / lanes : kByteCounterVectors;
@@ -61,19 +69,49 @@ void count_bins(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *
     }
     // Each bin's total is below 2^31, so its 32 bits hold it.
     for (uint32_t bin = 0; bin < kBins; ++bin) {
-      totals[bin] += static_cast<uint32_t>(sum_of_lanes(d64, hn::SumsOf8(counters[bin])));
+      hist[bin] += static_cast<uint32_t>(sum_of_lanes(d64, hn::SumsOf8(counters[bin])));
     }
   }
+  return i;
 #else
-  (void)d64;
-  (void)lanes;
-  (void)top_mask;
+  (void)pixels, (void)count, (void)bits, (void)hist;
+  return 0;
 #endif
-  for (; i < count; ++i) ++totals[pixels[i] >> shift];
-  for (uint32_t bin = 0; bin < kBins; ++bin) hist[bin] = totals[bin];
 }
 
-void CountTopBits(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *hist) {
+// A run of one value would make every increment wait for the store of the one before, so
+// consecutive pixels go to four histograms in turn -- the caller's and three on the stack (3 KiB
+// at most) -- that are added at the end. Eight pixels are read as one word, so the stores to
+// the histograms never have to be checked against the next pixels' loads; which byte of the
+// word goes to which histogram does not change the sums. Written out by hand, as compilers do
+// not unroll the lanes. Returns how many pixels it counted: whole words.
+size_t count_bins_four_ways(const uint8_t *pixels, size_t count, uint32_t bits, uint32_t *hist) {
+  const uint32_t shift = 8 - bits;
+  const uint32_t bins = uint32_t{1} << bits;
+  uint32_t lane1[256], lane2[256], lane3[256];
+  for (uint32_t bin = 0; bin < bins; ++bin) lane1[bin] = lane2[bin] = lane3[bin] = 0;
+  const auto bin_of = [shift](uint64_t word, unsigned byte) {
+    return static_cast<uint32_t>((word >> (8 * byte)) & 0xFF) >> shift;
+  };
+  size_t i = 0;
+  for (; count - i >= 8; i += 8) {
+    uint64_t word;
+    std::memcpy(&word, pixels + i, sizeof word);
+    ++hist[bin_of(word, 0)];
+    ++lane1[bin_of(word, 1)];
+    ++lane2[bin_of(word, 2)];
+    ++lane3[bin_of(word, 3)];
+    ++hist[bin_of(word, 4)];
+    ++lane1[bin_of(word, 5)];
+    ++lane2[bin_of(word, 6)];
+    ++lane3[bin_of(word, 7)];
+  }
+  // No bin can overflow: count is below 2^31.
+  for (uint32_t bin = 0; bin < bins; ++bin) hist[bin] += lane1[bin] + lane2[bin] + lane3[bin];
+  return i;
+}
+
+size_t CountBins(const uint8_t *pixels, size_t count, uint32_t bits, uint32_t *hist) {
   switch (bits) {
     case 0:
       return count_bins<1>(pixels, count, bits, hist);
@@ -83,8 +121,10 @@ void CountTopBits(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t
       return count_bins<4>(pixels, count, bits, hist);
     case 3:
       return count_bins<8>(pixels, count, bits, hist);
-    default:
+    case kMostVectorBinBits:
       return count_bins<16>(pixels, count, bits, hist);
+    default:
+      return count_bins_four_ways(pixels, count, bits, hist);
   }
 }
 
@@ -103,10 +143,8 @@ hn::Vec<hn::Repartition<uint32_t, D16>> pair_squares(D16, hn::Vec<D16> pixels) {
 }
 #endif
 
-#if HWY_TARGET == HWY_AVX3
-// On AVX-512 machines with byte dot products, which square a vector of pixels in one step. The
-// check is the compiler's, at run time: Highway's own target for these machines is not built,
-// as a target that only some of the library's sources build would split its dispatch.
+#if HWY_TARGET == HWY_AVX3_DL
+// AVX-512 with byte dot products, which square a vector of pixels in one step.
 //
 // Adds the pixels of whole 512-byte blocks from pixels[i] to both sums with the byte dot
 // product, which multiplies unsigned bytes by signed ones and adds each four products to a
@@ -114,12 +152,10 @@ hn::Vec<hn::Repartition<uint32_t, D16>> pair_squares(D16, hn::Vec<D16> pixels) {
 // q = p - 128 gives p * q = p^2 - 128 p: the squares are the dot products plus 128 times the
 // plain sum. The plain sum is a dot product too, with ones, rather than a sum of absolute
 // differences, which shares its port with the top bit's flip. Eight accumulators of each keep
-// eight dot products in flight. The standard deviation of 640 x 480 pixels took 1.66 to 1.80
-// times a read-only pass with four accumulators and the absolute differences, 1.46 to 1.59
-// with eight, and takes 1.29 to 1.36 so. Advances i past the blocks.
-__attribute__((target(HWY_TARGET_STR ",avx512vnni"))) void sum_blocks(const uint8_t *pixels,
-                                                                      size_t count, size_t &i,
-                                                                      PixelSums &result) {
+// eight dot products in flight. Advances i past the blocks. Highway's choice of this target
+// requires the 512-bit byte dot product, but its compile flags name only the 256-bit one.
+__attribute__((target("avx512vnni"))) void sum_blocks(const uint8_t *pixels, size_t count,
+                                                      size_t &i, PixelSums &result) {
   constexpr int kParts = 8;
   const __m512i top_bit = _mm512_set1_epi8(static_cast<char>(0x80));
   const __m512i ones = _mm512_set1_epi8(1);
@@ -154,51 +190,47 @@ __attribute__((target(HWY_TARGET_STR ",avx512vnni"))) void sum_blocks(const uint
 
 // Both sums are wanted modulo 2^32 only, so 32-bit lanes may wrap: the lanes' total is still
 // the true total modulo 2^32. The plain sum goes through 64-bit lanes, which the byte sums of
-// SumsOf8 fill directly.
-PixelSums SumPixels(const uint8_t *pixels, uint32_t count) {
-  PixelSums result{0, 0};
-  size_t i = 0;
-  const auto add_pixels = [&](size_t end) {
-    for (; i < end; ++i) {
-      const uint32_t value = pixels[i];
-      result.sum += value;
-      result.sum_of_squares += value * value;
-    }
-  };
+// SumsOf8 fill directly. Returns how many pixels it added: whole vectors, after a head that
+// leads a long run to a vector boundary.
+size_t SumPixels(const uint8_t *pixels, size_t count, PixelSums *sums) {
 #if KEL_STATISTICS_VECTORS
-  // Long runs are read from the first pixel on a vector boundary: a load that splits two cache
-  // lines costs about as much as two.
-  if (count >= kAlignFrom) {
-    const size_t lanes = hn::Lanes(D8());
-    add_pixels((lanes - reinterpret_cast<uintptr_t>(pixels) % lanes) % lanes);
-  }
-#if HWY_TARGET == HWY_AVX3
-  if (__builtin_cpu_supports("avx512vnni")) sum_blocks(pixels, count, i, result);
-#endif
   const D8 d;
+  const size_t lanes = hn::Lanes(d);
+  size_t i = 0;
+  // A load that splits two cache lines costs about as much as two.
+  if (count >= kAlignFrom) {
+    i = (lanes - reinterpret_cast<uintptr_t>(pixels) % lanes) % lanes;
+    plain::sum_pixels(pixels, i, sums);
+  }
+  PixelSums result = *sums;
+#if HWY_TARGET == HWY_AVX3_DL
+  sum_blocks(pixels, count, i, result);
+#endif
   const hn::RepartitionToWide<D8> d16;
   const hn::Repartition<uint32_t, D8> d32;
   const hn::Repartition<uint64_t, D8> d64;
-  const size_t lanes = hn::Lanes(d);
   const V8 zero = hn::Zero(d);
-  hn::Vec<decltype(d64)> sums = hn::Zero(d64);
+  hn::Vec<decltype(d64)> vector_sums = hn::Zero(d64);
   hn::Vec<decltype(d32)> squares = hn::Zero(d32);
   for (; count - i >= lanes; i += lanes) {
     const V8 v = hn::LoadU(d, pixels + i);
-    sums = hn::Add(sums, hn::SumsOf8(v));
+    vector_sums = hn::Add(vector_sums, hn::SumsOf8(v));
     squares = hn::Add(squares, pair_squares(d16, hn::ZipLower(d16, v, zero)));
     squares = hn::Add(squares, pair_squares(d16, hn::ZipUpper(d16, v, zero)));
   }
-  result.sum += static_cast<uint32_t>(sum_of_lanes(d64, sums));
+  result.sum += static_cast<uint32_t>(sum_of_lanes(d64, vector_sums));
   // The 32-bit lanes are added in 64-bit pairs first: a reduction of 32-bit lanes may be signed
   // arithmetic inside the instruction set's helpers, where a wrap is undefined.
   const auto squares64 = hn::BitCast(d64, squares);
   const auto pairs =
       hn::Add(hn::And(squares64, hn::Set(d64, 0xFFFFFFFFu)), hn::ShiftRight<32>(squares64));
   result.sum_of_squares += static_cast<uint32_t>(sum_of_lanes(d64, pairs));
+  *sums = result;
+  return i;
+#else
+  (void)pixels, (void)count, (void)sums;
+  return 0;
 #endif
-  add_pixels(count);
-  return result;
 }
 
 }  // namespace HWY_NAMESPACE
@@ -206,21 +238,4 @@ PixelSums SumPixels(const uint8_t *pixels, uint32_t count) {
 }  // namespace kel
 HWY_AFTER_NAMESPACE();
 
-#if HWY_ONCE
-namespace kel {
-namespace simd {
-
-HWY_EXPORT(CountTopBits);
-HWY_EXPORT(SumPixels);
-
-void count_top_bits(const uint8_t *pixels, uint32_t count, uint32_t bits, uint32_t *hist) {
-  HWY_DYNAMIC_DISPATCH(CountTopBits)(pixels, count, bits, hist);
-}
-
-PixelSums pixel_sums(const uint8_t *pixels, uint32_t count) {
-  return HWY_DYNAMIC_DISPATCH(SumPixels)(pixels, count);
-}
-
-}  // namespace simd
-}  // namespace kel
-#endif  // HWY_ONCE
+#endif  // KEL_SIMD_STATISTICS_INL_H_

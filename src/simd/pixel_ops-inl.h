@@ -1,16 +1,20 @@
-// Vector variants of the pixel operations' row loops, compiled once per instruction set and
-// picked at run time. The plain loops in pixel_ops.cpp are the reference they are tested
-// against, and finish the last pixels of each row that do not fill a vector.
-#undef HWY_TARGET_INCLUDE
-#define HWY_TARGET_INCLUDE "simd/pixel_ops_simd.cpp"
-#include "simd/pixel_ops_simd.h"
+// Vector variants of the pixel operations' rows, compiled once per instruction set through
+// simd/kernels_simd.cpp. Each does the first pixels of its row and returns how many; the plain
+// body finishes the row.
+#if defined(KEL_SIMD_PIXEL_OPS_INL_H_) == defined(HWY_TARGET_TOGGLE)
+#ifdef KEL_SIMD_PIXEL_OPS_INL_H_
+#undef KEL_SIMD_PIXEL_OPS_INL_H_
+#else
+#define KEL_SIMD_PIXEL_OPS_INL_H_
+#endif
 
-#include <hwy/foreach_target.h>  // must come before highway.h
 #include <hwy/highway.h>
 
 #include <cstdint>
 #include <cstring>
 #include <type_traits>
+
+#include "kernels.h"
 
 HWY_BEFORE_NAMESPACE();
 namespace kel {
@@ -18,8 +22,11 @@ namespace simd {
 namespace HWY_NAMESPACE {
 namespace hn = hwy::HWY_NAMESPACE;
 
-// The one-lane fallback target has no 16-bit view of a byte vector; it takes the plain loops.
+// The one-lane fallback target has no 16-bit view of a byte vector; it takes the plain bodies.
 #define KEL_PIXEL_OPS_VECTORS (HWY_TARGET != HWY_SCALAR)
+// AVX-512 masks its byte loads and stores natively; elsewhere a masked store of bytes is a load,
+// a blend and a store, or a loop over the lanes.
+#define KEL_NATIVE_BYTE_MASKS (HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3)
 
 using D8 = hn::ScalableTag<uint8_t>;
 
@@ -70,7 +77,10 @@ size_t bytes_to_boundary(const uint8_t *at, size_t size, size_t count) {
 struct EveryLane {};
 
 // Writes the vector v to out[i ..] where keep(d, i, load) holds, and only in the first `head`
-// lanes when head is given.
+// lanes when head is given (only where byte masks are native). Without native byte masks the
+// kept lanes are blended into the destination's own bytes and the whole vector is stored: a
+// transparent byte is written back with the value it holds, which the row's callers allow, and
+// one blend costs far less than a store per lane.
 template <class D, class V, class Keep, class Load>
 void store_vector(D d, size_t i, uint8_t *out, V v, const Keep &keep, const Load &load,
                   size_t head = 0) {
@@ -85,14 +95,18 @@ void store_vector(D d, size_t i, uint8_t *out, V v, const Keep &keep, const Load
   } else if constexpr (kEvery) {
     hn::StoreU(v, d, out + i);
   } else {
+#if KEL_NATIVE_BYTE_MASKS
     hn::BlendedStore(v, keep(d, i, load), d, out + i);
+#else
+    hn::StoreU(hn::IfThenElse(keep(d, i, load), v, hn::LoadU(d, out + i)), d, out + i);
+#endif
   }
 }
 
 // Loads a whole vector, once. Left alone, the compiler folds the load into each instruction
 // that uses the pixels, and every one of those loads splits a cache line when the input is not
-// aligned as the output is: darken read each vector three times and ran 1.6 times as long as
-// memcpy at 640 x 480. The empty asm makes the loaded value one the compiler cannot load again.
+// aligned as the output is. The empty asm makes the loaded value one the compiler cannot load
+// again.
 struct LoadWhole {
   template <class D>
   hn::Vec<D> operator()(D d, const uint8_t *at) const {
@@ -108,20 +122,16 @@ struct LoadWhole {
 // head is led to a vector boundary.
 constexpr size_t kLongRow = 4096;
 
-// Asks for the input line 2 KiB ahead, and for the output line there to be written. An image
+// Asks for the input line 2 KiB ahead, and for the output line there to be written: an image
 // that fits in L2 but not L1 then streams through faster than the hardware's own prefetching
-// brings it. Brighten of 640 x 480 pixels, over four relative alignments of input and output, in
-// times memcpy between the same buffers: 1.10-1.27 as it was; 1.05-1.13 asking 1 KiB ahead;
-// 1.04-1.13 asking 2 KiB ahead; 1.01-1.05 with that and two vectors read before either is stored
-// (long_row_vectors below); with AVX2 on the same machine, 1.09-1.29 before and 1.02-1.10 after.
-// Reading an input off the output's alignment in joined aligned vectors did worse (1.09-1.18)
-// and is gone. Prefetches never fault, so lines past the row's end cost only the read; the
-// addresses are made from integers, never from pointers out of range.
+// brings it, and the arithmetic of a row overlaps the stream. Prefetches never fault, so lines
+// past the row's end cost only the read; the addresses are made from integers, never from
+// pointers out of range.
 inline void prefetch_ahead(const uint8_t *in, const uint8_t *out) {
   constexpr uintptr_t kAhead = 2048;
   const uintptr_t read = reinterpret_cast<uintptr_t>(in) + kAhead;
   const uintptr_t write = reinterpret_cast<uintptr_t>(out) + kAhead;
-#if HWY_TARGET == HWY_AVX3
+#if KEL_NATIVE_BYTE_MASKS
   // Every processor with AVX-512 claims a line for writing with prefetchw.
   asm volatile("prefetcht0 (%0)\n\tprefetchw (%1)" : : "r"(read), "r"(write));
 #else
@@ -151,25 +161,26 @@ size_t long_row_vectors(const uint8_t *in, uint8_t *out, size_t i, size_t count,
   return i;
 }
 
-// Runs a row operation: value(d, i, load) is what the vector of pixels from i becomes,
-// keep(d, i, load) which of its lanes are written (EveryLane for all), both reading vectors with
-// load(d, address); plain(i, n) is the plain loop on pixels i .. i + n - 1. Full vectors start
-// where the output is on a full vector's boundary, so that no store splits a cache line (the
-// input rows commonly share the output's alignment, and then no load does either).
+// Runs a row operation and returns how many pixels it did: value(d, i, load) is what the vector
+// of pixels from i becomes, keep(d, i, load) which of its lanes are written (EveryLane for all),
+// both reading vectors with load(d, address); plain(i, n) is the plain body on pixels i .. i + n -
+// 1, used only to lead a long row to a vector boundary. Full vectors start where the output is on a
+// full vector's boundary, so that no store splits a cache line (the input rows commonly share
+// the output's alignment, and then no load does either).
 //
-// AVX-512 masks its byte loads and stores natively: the lanes before the boundary are one masked
-// store of a vector that lies inside the row, and those after the last full vector, or of a row
-// shorter than one, are one masked load and store. The other targets lead long rows up to the
-// boundary with the plain loop and 16-byte vectors, and finish with 16-byte vectors and the
-// plain loop.
+// With native byte masks the lanes before the boundary are one masked store of a vector that
+// lies inside the row, and those after the last full vector, or of a row shorter than one, are
+// one masked load and store: the whole row is done. The other targets lead long rows up to the
+// boundary with the plain body and 16-byte vectors, and end with 16-byte vectors, leaving the
+// last pixels to the plain body.
 template <class Value, class Keep, class Plain>
-void for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Value &value,
-                     const Keep &keep, const Plain &plain) {
+size_t for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Value &value,
+                       const Keep &keep, const Plain &plain) {
   const D8 d;
   const size_t lanes = hn::Lanes(d);
   const LoadWhole whole;
   size_t i = 0;
-#if HWY_TARGET == HWY_AVX3
+#if KEL_NATIVE_BYTE_MASKS
   (void)plain;
   if (count >= lanes && bytes_to_boundary(out, lanes, count) != 0) {
     i = bytes_to_boundary(out, lanes, count);
@@ -195,6 +206,7 @@ void for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Value 
     const auto part = [&rest](D8 dd, const uint8_t *at) { return hn::MaskedLoad(rest, dd, at); };
     store_vector(d, i, out, value(d, i, part), keep, part, count - i);
   }
+  return count;
 #else
   const hn::CappedTag<uint8_t, 16> d16;
   const size_t short_lanes = hn::Lanes(d16);
@@ -214,7 +226,7 @@ void for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Value 
   for (; count - i >= short_lanes; i += short_lanes) {
     store_vector(d16, i, out, value(d16, i, whole), keep, whole);
   }
-  if (i != count) plain(i, count - i);
+  return i;
 #endif
 }
 
@@ -222,13 +234,13 @@ void for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Value 
 // of the distance to the target), is added or taken off. At 100 percent every pixel moves the
 // whole way, to 255 or to 0.
 template <bool kTowardWhite>
-void MoveRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+size_t MoveRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
   if (percent >= 100) {
     std::memset(out, kTowardWhite ? 255 : 0, count);
-    return;
+    return count;
   }
   const uint16_t factor = percent_factor(percent);
-  for_each_vector(
+  return for_each_vector(
       in, out, count,
       [&](auto d, size_t i, const auto &load) {
         const auto pixels = load(d, in + i);
@@ -237,100 +249,106 @@ void MoveRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
       },
       EveryLane(),
       [&](size_t first, size_t n) {
-        (kTowardWhite ? plain::brighten_row : plain::darken_row)(in + first, n, percent,
-                                                                 out + first);
+        (kTowardWhite ? plain::brighten : plain::darken)(in + first, n, percent, out + first);
       });
 }
 
-void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
-  MoveRow<true>(in, count, percent, out);
+size_t BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  return MoveRow<true>(in, count, percent, out);
 }
 
-void DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
-  MoveRow<false>(in, count, percent, out);
+size_t DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
+  return MoveRow<false>(in, count, percent, out);
 }
 
-// Short rows copy faster this way than through memmove, which the plain loop uses.
-void CopyRow(const uint8_t *in, size_t count, uint8_t *out) {
-  for_each_vector(
-      in, out, count, [&](auto d, size_t i, const auto &load) { return load(d, in + i); },
-      EveryLane(), [&](size_t first, size_t n) { plain::copy_row(in + first, n, out + first); });
+// The C library's memmove, which the plain body calls, copies a row at least as fast as a
+// vector loop on every target: the copy is left to it.
+size_t CopyRow(const uint8_t *, size_t, uint8_t *) {
+  return 0;
 }
 
-void BlendRow(const uint8_t *in, size_t count, uint8_t *out) {
-  for_each_vector(
+size_t BlendRow(const uint8_t *in, size_t count, uint8_t *out) {
+  return for_each_vector(
       in, out, count,
       [&](auto d, size_t i, const auto &load) {
         return floor_average(d, load(d, out + i), load(d, in + i));
       },
-      EveryLane(), [&](size_t first, size_t n) { plain::blend_row(in + first, n, out + first); });
+      EveryLane(), [&](size_t first, size_t n) { plain::blend(in + first, n, out + first); });
 }
 
-// The transparent pixels are left out of the store, so their destination bytes are not written.
-void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  for_each_vector(
+// The transparent pixels keep their destination bytes (see store_vector).
+size_t PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  return for_each_vector(
       in, out, count, [&](auto d, size_t i, const auto &load) { return load(d, in + i); },
       [&](auto d, size_t i, const auto &load) { return hn::Ne(load(d, in + i), hn::Set(d, key)); },
-      [&](size_t first, size_t n) { plain::paste_row_with_key(in + first, n, key, out + first); });
+      [&](size_t first, size_t n) { plain::paste_keyed(in + first, n, key, out + first); });
 }
 
-void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  for_each_vector(
+size_t BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  return for_each_vector(
       in, out, count,
       [&](auto d, size_t i, const auto &load) {
         return floor_average(d, load(d, out + i), load(d, in + i));
       },
       [&](auto d, size_t i, const auto &load) { return hn::Ne(load(d, in + i), hn::Set(d, key)); },
-      [&](size_t first, size_t n) { plain::blend_row_with_key(in + first, n, key, out + first); });
+      [&](size_t first, size_t n) { plain::blend_keyed(in + first, n, key, out + first); });
 }
 
-void MaskRow(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  for_each_vector(
+size_t MaskRow(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  return for_each_vector(
       in, out, count,
       [&](auto d, size_t i, const auto &load) {
         return hn::IfThenElseZero(hn::Ne(load(d, in + i), hn::Set(d, key)), hn::Set(d, 1));
       },
-      EveryLane(),
-      [&](size_t first, size_t n) { plain::mask_row(in + first, n, key, out + first); });
+      EveryLane(), [&](size_t first, size_t n) { plain::mask(in + first, n, key, out + first); });
 }
 
-// Whole vectors from the end while they hold no zero; the plain loop finds the byte in the
-// vector that does.
-size_t EndOfLastZero(const uint8_t *bytes, size_t count) {
+// Destination rows of a paste lie a raster row apart, too far for the hardware's prefetching to
+// follow.
+void PrefetchForWriting(uintptr_t at, size_t count) {
+  constexpr uintptr_t kLine = 64;
+  for (uintptr_t line = at & ~(kLine - 1); line < at + count; line += kLine) {
+    __builtin_prefetch(reinterpret_cast<const void *>(line), 1, 3);
+  }
+}
+
+// Whole vectors from the end while they hold no zero.
+size_t NonzeroTail(const uint8_t *bytes, size_t count) {
   const D8 d;
   size_t end = count;
   while (end >= hn::Lanes(d) &&
          hn::AllFalse(d, hn::Eq(hn::LoadU(d, bytes + end - hn::Lanes(d)), hn::Zero(d)))) {
     end -= hn::Lanes(d);
   }
-  return plain::end_of_last_zero(bytes, end);
+  return count - end;
 }
 
 #else
-// The fallback target's variants are the plain loops.
-void BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
-  plain::brighten_row(in, count, percent, out);
+// The fallback target leaves every row to the plain bodies.
+size_t BrightenRow(const uint8_t *, size_t, uint16_t, uint8_t *) {
+  return 0;
 }
-void DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
-  plain::darken_row(in, count, percent, out);
+size_t DarkenRow(const uint8_t *, size_t, uint16_t, uint8_t *) {
+  return 0;
 }
-void CopyRow(const uint8_t *in, size_t count, uint8_t *out) {
-  plain::copy_row(in, count, out);
+size_t CopyRow(const uint8_t *, size_t, uint8_t *) {
+  return 0;
 }
-void BlendRow(const uint8_t *in, size_t count, uint8_t *out) {
-  plain::blend_row(in, count, out);
+size_t BlendRow(const uint8_t *, size_t, uint8_t *) {
+  return 0;
 }
-void PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  plain::paste_row_with_key(in, count, key, out);
+size_t PasteRowWithKey(const uint8_t *, size_t, uint8_t, uint8_t *) {
+  return 0;
 }
-void BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  plain::blend_row_with_key(in, count, key, out);
+size_t BlendRowWithKey(const uint8_t *, size_t, uint8_t, uint8_t *) {
+  return 0;
 }
-void MaskRow(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  plain::mask_row(in, count, key, out);
+size_t MaskRow(const uint8_t *, size_t, uint8_t, uint8_t *) {
+  return 0;
 }
-size_t EndOfLastZero(const uint8_t *bytes, size_t count) {
-  return plain::end_of_last_zero(bytes, count);
+void PrefetchForWriting(uintptr_t, size_t) {}
+size_t NonzeroTail(const uint8_t *, size_t) {
+  return 0;
 }
 #endif  // KEL_PIXEL_OPS_VECTORS
 
@@ -339,44 +357,4 @@ size_t EndOfLastZero(const uint8_t *bytes, size_t count) {
 }  // namespace kel
 HWY_AFTER_NAMESPACE();
 
-#if HWY_ONCE
-namespace kel {
-namespace simd {
-
-HWY_EXPORT(BrightenRow);
-HWY_EXPORT(DarkenRow);
-HWY_EXPORT(CopyRow);
-HWY_EXPORT(BlendRow);
-HWY_EXPORT(PasteRowWithKey);
-HWY_EXPORT(BlendRowWithKey);
-HWY_EXPORT(MaskRow);
-HWY_EXPORT(EndOfLastZero);
-
-void brighten_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
-  HWY_DYNAMIC_DISPATCH(BrightenRow)(in, count, percent, out);
-}
-void darken_row(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
-  HWY_DYNAMIC_DISPATCH(DarkenRow)(in, count, percent, out);
-}
-
-void mask_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  HWY_DYNAMIC_DISPATCH(MaskRow)(in, count, key, out);
-}
-
-size_t end_of_last_zero(const uint8_t *bytes, size_t count) {
-  return HWY_DYNAMIC_DISPATCH(EndOfLastZero)(bytes, count);
-}
-
-// Each row call through the dispatch asks the library for the chosen target again; a paste of
-// a few hundred short rows takes the three pointers once instead. Until the first dispatched
-// call has chosen a target the table holds the choosing stubs, so one empty call goes first.
-CompositeRowLoops composite_row_loops() {
-  uint8_t nothing = 0;
-  HWY_DYNAMIC_DISPATCH(CopyRow)(&nothing, 0, &nothing);
-  return {&HWY_DYNAMIC_DISPATCH(CopyRow), &HWY_DYNAMIC_DISPATCH(BlendRow),
-          &HWY_DYNAMIC_DISPATCH(PasteRowWithKey), &HWY_DYNAMIC_DISPATCH(BlendRowWithKey)};
-}
-
-}  // namespace simd
-}  // namespace kel
-#endif  // HWY_ONCE
+#endif  // KEL_SIMD_PIXEL_OPS_INL_H_

@@ -1,16 +1,20 @@
-// Vector variants of the rotations' inner loop: one run of canvas pixels along a row, every one
-// of which maps inside the source. Compiled once per instruction set and picked at run time; the
-// plain loop in rotation.cpp is the reference they are tested against, bit for bit.
+// Vector variants of the rotations' runs: consecutive canvas pixels of a row, every one of
+// which maps inside the source. Compiled once per instruction set through
+// simd/kernels_simd.cpp; each does whole vectors and returns how many pixels it did.
 //
-// Lanes are 32-bit. The caller takes this path only for sources below 2^16 on each side and
-// below 2^31 pixels, so every position inside the source (below 2^16 * 16384 = 2^30), every
-// step between them and every byte offset fits a lane exactly.
-#undef HWY_TARGET_INCLUDE
-#define HWY_TARGET_INCLUDE "simd/rotation_simd.cpp"
-#include "simd/rotation_simd.h"
+// Lanes are 32-bit. The variants take only sources below 2^16 on each side and below 2^31
+// pixels, so every position inside the source (below 2^16 * 16384 = 2^30), every step between
+// them and every byte offset fits a lane exactly; they leave other runs to the plain body.
+#if defined(KEL_SIMD_ROTATION_INL_H_) == defined(HWY_TARGET_TOGGLE)
+#ifdef KEL_SIMD_ROTATION_INL_H_
+#undef KEL_SIMD_ROTATION_INL_H_
+#else
+#define KEL_SIMD_ROTATION_INL_H_
+#endif
 
-#include <hwy/foreach_target.h>  // must come before highway.h
 #include <hwy/highway.h>
+
+#include "kernels.h"
 
 HWY_BEFORE_NAMESPACE();
 namespace kel {
@@ -28,7 +32,33 @@ struct Positions {
   V32 x, y;
 };
 
-Positions first_positions(D32 d, const RotationRow &row) {
+// The run in 32-bit lanes, as the variants read it.
+struct LaneRun {
+  const void *src;
+  int32_t height, width;
+  int32_t x, y, step_x, step_y;
+  size_t count;
+};
+
+// Whether the run's source keeps every position and offset inside a 32-bit lane, and has at
+// least `least_pixels` pixels.
+bool fits_lanes(const RotationRun &run, int64_t least_pixels) {
+  return run.width < (1 << 16) && run.height < (1 << 16) &&
+         run.width * run.height < (int64_t{1} << 31) && run.width * run.height >= least_pixels;
+}
+
+LaneRun lanes_of(const RotationRun &run) {
+  return {run.src,
+          static_cast<int32_t>(run.height),
+          static_cast<int32_t>(run.width),
+          static_cast<int32_t>(run.x),
+          static_cast<int32_t>(run.y),
+          run.step_x,
+          run.step_y,
+          run.count};
+}
+
+Positions first_positions(D32 d, const LaneRun &row) {
   const V32 lane = hn::Iota(d, 0);
   return {hn::Add(hn::Set(d, row.x), hn::Mul(lane, hn::Set(d, row.step_x))),
           hn::Add(hn::Set(d, row.y), hn::Mul(lane, hn::Set(d, row.step_y)))};
@@ -73,46 +103,31 @@ struct NeighbourPairs {
 // position's offset, (P01, P11) the last two of one at offset + width - 2. Both reads stay inside
 // the source: a bilinear position has x0 + 1 < W and y0 + 1 < H, so the first read ends at byte
 // (H - 1) * W + 1 at most and the second starts at byte W - 2 or later. A byte shuffle spreads
-// each pair into the halves of its lane; the one-lane fallback target takes the bytes apart.
+// each pair into the halves of its lane. Its indices are places in memory, so the halves hold the
+// same values in either byte order; taking the word apart by shifts would assume that its first
+// byte in memory is its low one, as only on little-endian CPUs. Each lane takes bytes of its own
+// word only, so the one-lane fallback target shuffles too.
 class NeighbourReader {
  public:
   NeighbourReader(D32 d, const uint8_t *src, int32_t width)
       : words_(reinterpret_cast<const int32_t *>(src)), below_(hn::Set(d, width - 2)) {
-#if HWY_TARGET != HWY_SCALAR
     // Shuffle indices count bytes from the start of each 16-byte block, four lanes to a block;
     // an index of 0x80 gives a zero byte.
     const V32 lane_start = hn::ShiftLeft<2>(hn::And(hn::Iota(d, 0), hn::Set(d, 3)));
     const V32 in_lane = hn::Or(lane_start, hn::ShiftLeft<16>(lane_start));
     first_two_ = hn::Or(in_lane, hn::Set(d, static_cast<int32_t>(0x80018000u)));
     last_two_ = hn::Or(in_lane, hn::Set(d, static_cast<int32_t>(0x80038002u)));
-#endif
   }
 
   NeighbourPairs pairs(D32 d, V32 offset) const {
     const V32 upper = hn::GatherOffset(d, words_, offset);
     const V32 lower = hn::GatherOffset(d, words_, hn::Add(offset, below_));
-#if HWY_TARGET == HWY_SCALAR
-    const V32 byte = hn::Set(d, 0xFF);
-    const V32 third_byte = hn::Set(d, 0xFF0000);
-    return {hn::Or(hn::And(upper, byte), hn::And(hn::ShiftLeft<8>(upper), third_byte)),
-            hn::Or(hn::And(hn::ShiftRight<16>(lower), byte),
-                   hn::And(hn::ShiftRight<8>(lower), third_byte))};
-#else
-    const hn::Repartition<uint8_t, D32> d8;
-    const auto spread = [&](V32 word, V32 indices) {
-      return hn::BitCast(d,
-                         hn::TableLookupBytesOr0(hn::BitCast(d8, word), hn::BitCast(d8, indices)));
-    };
-    return {spread(upper, first_two_), spread(lower, last_two_)};
-#endif
+    return {hn::TableLookupBytesOr0(upper, first_two_), hn::TableLookupBytesOr0(lower, last_two_)};
   }
 
  private:
   const int32_t *words_;
-  V32 below_;
-#if HWY_TARGET != HWY_SCALAR
-  V32 first_two_, last_two_;
-#endif
+  V32 below_, first_two_, last_two_;
 };
 
 // The bilinear total ay * top + fy * bottom, with ay = 2^14 - fy, is 2^14 * top + fy * diff for
@@ -145,7 +160,7 @@ V32 bilinear_pixels(D32 d, const NeighbourPairs &pixels, V32 fx, V32 fy) {
 
 template <typename Pixel>
 void store_pixels(V32 values, Pixel *out) {
-#if HWY_TARGET == HWY_AVX3
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
   // Every value fits its pixel, so keeping each lane's low byte is exact: one instruction where
   // the saturating demotion packs twice and permutes.
   _mm_storeu_si128(reinterpret_cast<__m128i *>(out), _mm512_cvtepi32_epi8(values.raw));
@@ -156,7 +171,7 @@ void store_pixels(V32 values, Pixel *out) {
 }
 
 template <bool kSigned, typename Pixel>
-size_t bilinear_row(const RotationRow &row, Pixel *out) {
+size_t bilinear_row(const LaneRun &row, Pixel *out) {
   const D32 d;
   const size_t lanes = hn::Lanes(d);
   const auto *src = static_cast<const uint8_t *>(row.src);
@@ -187,18 +202,18 @@ size_t bilinear_row(const RotationRow &row, Pixel *out) {
   return done;
 }
 
-size_t BilinearRowU8(const RotationRow &row, uint8_t *out) {
-  return bilinear_row<false>(row, out);
+size_t BilinearRowU8(const RotationRun &run, uint8_t *out) {
+  return fits_lanes(run, 1) ? bilinear_row<false>(lanes_of(run), out) : 0;
 }
 
-size_t BilinearRowI8(const RotationRow &row, int8_t *out) {
-  return bilinear_row<true>(row, out);
+size_t BilinearRowI8(const RotationRun &run, int8_t *out) {
+  return fits_lanes(run, 1) ? bilinear_row<true>(lanes_of(run), out) : 0;
 }
 
 // One 4-byte read per lane holds the pixel: at its own offset where the source has three more
-// bytes after it, else ending at it (the last pixels of the source). The caller takes this path
-// only for sources of four pixels or more, so both reads stay inside.
-size_t NearestRowI8(const RotationRow &row, int8_t *out) {
+// bytes after it, else ending at it (the last pixels of the source). Only sources of four pixels
+// or more are taken, so both reads stay inside.
+size_t nearest_row(const LaneRun &row, int8_t *out) {
   const D32 d;
   const size_t lanes = hn::Lanes(d);
   const auto *words = static_cast<const int32_t *>(row.src);
@@ -207,15 +222,20 @@ size_t NearestRowI8(const RotationRow &row, int8_t *out) {
   const V32 advance_y = hn::Set(d, row.step_y * static_cast<int32_t>(lanes));
   const V32 last_read = hn::Set(d, row.width * row.height - 4);
   const V32 width = hn::Set(d, row.width);
+  // Shuffle indices as in NeighbourReader, for each lane's top byte; its other three are zeroed.
+  const V32 lane_top =
+      hn::Or(hn::ShiftLeft<26>(hn::And(hn::Iota(d, 0), hn::Set(d, 3))), hn::Set(d, 0x808080));
   const size_t count = row.count;
   size_t done = 0;
   for (; done + lanes <= count; done += lanes) {
     const V32 offset = pixel_offsets(p, width);
     const V32 read_at = hn::Min(offset, last_read);
     const V32 word = hn::GatherOffset(d, words, read_at);
-    // The pixel is byte (offset - read_at) of the word; move it to the top and sign-extend.
-    const V32 to_top = hn::Sub(hn::Set(d, 24), hn::ShiftLeft<3>(hn::Sub(offset, read_at)));
-    const V32 value = hn::ShiftRight<24>(word << to_top);
+    // The pixel is byte (offset - read_at) of the word in memory order: a byte shuffle moves it
+    // to the top, in either byte order (a shift by its number would assume little-endian), and
+    // the arithmetic shift sign-extends it.
+    const V32 pick = hn::Or(hn::ShiftLeft<24>(hn::Sub(offset, read_at)), lane_top);
+    const V32 value = hn::ShiftRight<24>(hn::TableLookupBytesOr0(word, pick));
     // -128 marks uncovered pixels, so a covered -128 is stored as -127.
     store_pixels(hn::Max(value, hn::Set(d, -127)), out + done);
     p.x = hn::Add(p.x, advance_x);
@@ -224,31 +244,13 @@ size_t NearestRowI8(const RotationRow &row, int8_t *out) {
   return done;
 }
 
+size_t NearestRowI8(const RotationRun &run, int8_t *out) {
+  return fits_lanes(run, 4) ? nearest_row(lanes_of(run), out) : 0;
+}
+
 }  // namespace HWY_NAMESPACE
 }  // namespace simd
 }  // namespace kel
 HWY_AFTER_NAMESPACE();
 
-#if HWY_ONCE
-namespace kel {
-namespace simd {
-
-HWY_EXPORT(BilinearRowU8);
-HWY_EXPORT(BilinearRowI8);
-HWY_EXPORT(NearestRowI8);
-
-size_t rotate_row_bilinear(const RotationRow &row, uint8_t *out) {
-  return HWY_DYNAMIC_DISPATCH(BilinearRowU8)(row, out);
-}
-
-size_t rotate_row_bilinear(const RotationRow &row, int8_t *out) {
-  return HWY_DYNAMIC_DISPATCH(BilinearRowI8)(row, out);
-}
-
-size_t rotate_row_nearest(const RotationRow &row, int8_t *out) {
-  return HWY_DYNAMIC_DISPATCH(NearestRowI8)(row, out);
-}
-
-}  // namespace simd
-}  // namespace kel
-#endif  // HWY_ONCE
+#endif  // KEL_SIMD_ROTATION_INL_H_
