@@ -20,16 +20,26 @@
 
 namespace {
 
-// The one place that decides whether a figure's pixel lands in the raster. All four comparisons
-// are signed, so a raster with height <= 0 or width <= 0 receives nothing.
+// The one place that decides whether a figure's pixel lands in the raster. A raster has rows and
+// columns: the routines return before making one of a raster with height <= 0 or width <= 0,
+// which receives nothing. So a position is inside when, read as unsigned, it is below the size:
+// a negative one reads as a larger number than any size.
 struct Raster {
   uint8_t *pixels;
   int32_t height, width;
 
-  bool has_column(int64_t x) const { return x >= 0 && x < width; }
-  bool has_row(int64_t y) const { return y >= 0 && y < height; }
+  bool has_column(int64_t x) const {
+    return static_cast<uint64_t>(x) < static_cast<uint64_t>(width);
+  }
+  bool has_row(int64_t y) const { return static_cast<uint64_t>(y) < static_cast<uint64_t>(height); }
+  // The same for the 32-bit positions of the public calls.
+  bool has_column(int32_t x) const {
+    return static_cast<uint32_t>(x) < static_cast<uint32_t>(width);
+  }
+  bool has_row(int32_t y) const { return static_cast<uint32_t>(y) < static_cast<uint32_t>(height); }
 
-  void plot(int64_t x, int64_t y, uint8_t colour) const {
+  template <typename Position>
+  void plot(Position x, Position y, uint8_t colour) const {
     if (has_column(x) && has_row(y)) {
       // y * width + x < height * width, the size of the caller's buffer, so it fits size_t.
       pixels[static_cast<size_t>(y) * static_cast<size_t>(width) + static_cast<size_t>(x)] = colour;
@@ -73,13 +83,11 @@ __attribute__((noinline)) void write_run(uint8_t *pixels, size_t first, size_t c
 }
 
 // The pixels (x + k * step_x, y + k * step_y) for the steps k in `along`, step_x and step_y each
-// -1, 0 or +1: a row, a column or a diagonal. Those inside form one range of k; a caller that
-// knows the whole run to lie inside says so in all_inside, and the range is not narrowed.
+// -1, 0 or +1: a row, a column or a diagonal. Those inside form one range of k.
 void draw_run(const Raster &raster, int64_t x, int64_t y, int32_t step_x, int32_t step_y,
-              Steps along, uint8_t colour, bool all_inside = false) {
-  const Steps inside = all_inside ? along
-                                  : along.intersect(steps_inside(x, step_x, raster.width))
-                                        .intersect(steps_inside(y, step_y, raster.height));
+              Steps along, uint8_t colour) {
+  const Steps inside = along.intersect(steps_inside(x, step_x, raster.width))
+                           .intersect(steps_inside(y, step_y, raster.height));
   if (inside.empty()) return;
   // Inside the raster, positions and buffer indices fit size_t (and 32 bits on a 32-bit core).
   const auto begin = static_cast<size_t>(inside.begin);
@@ -120,8 +128,7 @@ struct LineInterior {
 // minor_direction, nondecreasing along the line) reaches target; steps.end if none. The offset
 // floor(i * minor / major) reaches t > 0 exactly when i * minor >= t * major, so the step is ceil(t
 // * major / minor). Both t and major_length are below 2^32, so the product stays below 2^64.
-__attribute__((noinline)) int64_t first_step_reaching(const LineInterior &line, Steps steps,
-                                                      int64_t target) {
+int64_t first_step_reaching(const LineInterior &line, Steps steps, int64_t target) {
   const int64_t needed = target - line.minor_direction * line.minor_start;
   if (needed <= 0) return steps.begin;
   if (line.minor_length == 0) return steps.end;
@@ -181,16 +188,15 @@ inline void draw_line_interior(const Raster &raster, const LineInterior &line, u
       line.minor_start + line.minor_direction * static_cast<int64_t>(offset.quotient);
   // Every pixel of the range lies inside, so its buffer index is below height * width and the
   // loop steps it in size_t, strides wrapping for the negative directions: 32-bit work on a
-  // 32-bit core, whatever the line's coordinates.
-  size_t at = static_cast<size_t>(line.steep ? major * width + minor : minor * width + major);
-  const auto width_stride = static_cast<size_t>(width);
+  // 32-bit core, whatever the line's coordinates. Fewer than major_length steps, so the count
+  // fits 32 bits.
+  const size_t at = static_cast<size_t>(line.steep ? major * width + minor : minor * width + major);
   const auto major_stride = static_cast<size_t>(line.major_direction);
-  const size_t major_step = line.steep ? width_stride : major_stride;
-  const size_t minor_step = line.steep ? static_cast<size_t>(line.minor_direction) : width_stride;
-  // Fewer than major_length steps, so the count fits 32 bits.
-  step_line(raster.pixels + at, static_cast<uint32_t>(steps.end - steps.begin), major_step,
-            minor_step, offset.remainder - line.major_length, line.minor_length, line.major_length,
-            colour);
+  const auto minor_stride = static_cast<size_t>(line.minor_direction);
+  const auto width_stride = static_cast<size_t>(width);
+  step_line(raster.pixels + at, static_cast<uint32_t>(steps.end - steps.begin),
+            line.steep ? width_stride : major_stride, line.steep ? minor_stride : width_stride,
+            offset.remainder - line.major_length, line.minor_length, line.major_length, colour);
 }
 
 // |value| of a difference of two 32-bit coordinates, below 2^32.
@@ -218,87 +224,6 @@ void draw_line(const Raster &raster, int64_t x0, int64_t y0, int64_t x1, int64_t
   }
 }
 
-// Lines whose end points both lie inside the raster, and so every pixel between them (the raster
-// is convex), with a major length up to 2^16: the common case, drawn in 32-bit steps without
-// clipping. The minor offset floor(i * minor / major) advances as a 32-bit fraction,
-// f = ceil(minor * 2^32 / major): i * f exceeds i * minor * 2^32 / major by less than i, while
-// that quotient's fraction stays at least 1 / major short of the next whole number, so for
-// i < major <= 2^16 both have the same whole part, and the fraction's carries are the offset's.
-// A steep line moves one row and, on a carry, one column, in one add with carry; a flat line
-// moves one column and, on a carry, one row.
-
-// ceil(minor * 2^32 / major) for minor <= major <= 2^16, in two 16-bit long-division steps; 0
-// for minor == major (2^32 wraps), a diagonal, whose every step moves both ways.
-uint32_t line_fraction(uint32_t minor, uint32_t major) {
-  const uint32_t high = (minor << 16) / major, rest = ((minor << 16) % major) << 16;
-  return (high << 16) + rest / major + (rest % major != 0 ? 1 : 0);
-}
-
-// count pixels, each step past `at` and one more column on every carry of frac += f. A column to
-// the left is taken as step = width - 1 plus one on every step that does not carry: with
-// frac and f complemented, the carries of the complement are exactly the steps without one.
-__attribute__((noinline)) void step_steep_line(uintptr_t at, uint32_t count, uintptr_t step,
-                                               uint32_t frac, uint32_t f, uint8_t colour) {
-  do {
-    frac += f;
-    at += step + (frac < f ? 1 : 0);
-    *reinterpret_cast<uint8_t *>(at) = colour;
-  } while (--count != 0);
-}
-
-// count pixels, each one column past the last in `direction`, and one row lower on every carry.
-// (Each store moves the address on by one column for the next pixel, which is one store fewer
-// per pixel; the address after the last may lie outside the raster, and is not used.)
-template <int direction>
-__attribute__((noinline)) void step_flat_line(uintptr_t at, uint32_t count, size_t width,
-                                              uint32_t f, uint8_t colour) {
-  uint32_t frac = 0;
-  at += static_cast<uintptr_t>(direction);
-  do {
-    frac += f;
-    if (frac < f) at += width;
-    *reinterpret_cast<uint8_t *>(at) = colour;
-    at += static_cast<uintptr_t>(direction);
-  } while (--count != 0);
-}
-
-// Draws the line when both end points lie inside and the major length is at most 2^16; returns
-// false, having drawn nothing, otherwise.
-bool draw_line_inside(const Raster &raster, int32_t x0, int32_t y0, int32_t x1, int32_t y1,
-                      uint8_t colour) {
-  if (!raster.has_column(x0) || !raster.has_row(y0) || !raster.has_column(x1) ||
-      !raster.has_row(y1)) {
-    return false;
-  }
-  if (y0 > y1) {
-    std::swap(x0, x1);
-    std::swap(y0, y1);
-  }
-  // Both inside: the differences fit 32 bits.
-  const uint32_t run = static_cast<uint32_t>(x1 < x0 ? x0 - x1 : x1 - x0);
-  const uint32_t rise = static_cast<uint32_t>(y1 - y0);
-  const uint32_t major = std::max(run, rise);
-  if (major > 65536) return false;
-  const size_t width = static_cast<size_t>(raster.width);
-  uint8_t *const first = raster.pixels + static_cast<size_t>(y0) * width + static_cast<size_t>(x0);
-  *first = colour;
-  raster.pixels[static_cast<size_t>(y1) * width + static_cast<size_t>(x1)] = colour;
-  if (major < 2) return true;
-  const auto at = reinterpret_cast<uintptr_t>(first);
-  const uint32_t f = line_fraction(std::min(run, rise), major);  // 0 for a diagonal
-  if (rise >= run) {  // steep, or a diagonal: a row every step, a column on every carry
-    size_t step = width + (rise == run ? 1 : 0);
-    uint32_t frac = 0, add = f;
-    if (x1 < x0) step = width - 1, frac = ~0u, add = 0u - f;
-    step_steep_line(at, major - 1, step, frac, add, colour);
-  } else if (x1 < x0) {
-    step_flat_line<-1>(at, major - 1, width, f, colour);
-  } else {
-    step_flat_line<1>(at, major - 1, width, f, colour);
-  }
-  return true;
-}
-
 // ---- Rectangles --------------------------------------------------------------------------------
 
 void draw_rectangle(const Raster &raster, int64_t x, int64_t y, uint32_t rect_width,
@@ -307,14 +232,12 @@ void draw_rectangle(const Raster &raster, int64_t x, int64_t y, uint32_t rect_wi
   const int64_t bottom = y + int64_t{rect_height} - 1;
   // Top and bottom edges own the corners; the sides cover only the rows strictly between.
   const Steps columns{0, int64_t{rect_width}};
-  const bool inside = raster.has_column(x) && raster.has_column(right) && raster.has_row(y) &&
-                      raster.has_row(bottom);
-  draw_run(raster, x, y, 1, 0, columns, colour, inside);
-  draw_run(raster, x, bottom, 1, 0, columns, colour, inside);
+  draw_run(raster, x, y, 1, 0, columns, colour);
+  draw_run(raster, x, bottom, 1, 0, columns, colour);
   if (rect_height < 3) return;
   const Steps rows{1, int64_t{rect_height} - 1};
-  draw_run(raster, x, y, 0, 1, rows, colour, inside);
-  draw_run(raster, right, y, 0, 1, rows, colour, inside);
+  draw_run(raster, x, y, 0, 1, rows, colour);
+  draw_run(raster, right, y, 0, 1, rows, colour);
 }
 
 // ---- Numbers -----------------------------------------------------------------------------------
@@ -359,25 +282,25 @@ uint32_t spread_bits(uint32_t bits) {
 // box is written as the two leave it, the glyph's four pixels of the row one word, colour where
 // its bits are set and background elsewhere, and a row that lies whole inside in one copy.
 void draw_digit(const Raster &raster, int32_t digit, int64_t pen, int64_t y, uint8_t colour) {
+  constexpr int64_t kBoxColumns = kGlyphColumns + 2;
   const uint8_t background = static_cast<uint8_t>(255 - colour);
   const uint32_t mask = kGlyphMasks[digit];
   const uint32_t fill = background * 0x01010101u, change = (background ^ colour) * 0x01010101u;
-  const bool columns_inside = raster.has_column(pen - 1) && raster.has_column(pen + 4);
-  const auto width = static_cast<size_t>(raster.width);
+  // The box's columns that land inside: [first, past) of those from pen - 1.
+  const int64_t left = pen - 1;
+  const int64_t first = left < 0 ? -left : 0;
+  const int64_t past = raster.width - left < kBoxColumns ? raster.width - left : kBoxColumns;
+  if (first >= past) return;
   for (int32_t row = -1; row <= 7; ++row) {
     if (!raster.has_row(y + row)) continue;
-    const uint32_t bits = row < 0 || row > 6 ? 0 : (mask >> (4 * row)) & 15u;
+    const uint32_t bits = row < 0 || row > 6 ? 0 : (mask >> (kGlyphColumns * row)) & 15u;
     const uint32_t glyph = fill ^ (spread_bits(bits) & change);
-    uint8_t cells[kGlyphColumns + 2] = {background, 0, 0, 0, 0, background};
+    uint8_t cells[kBoxColumns] = {background, 0, 0, 0, 0, background};
     std::memcpy(cells + 1, &glyph, 4);
-    if (columns_inside) {
-      std::memcpy(
-          raster.pixels + static_cast<size_t>(y + row) * width + static_cast<size_t>(pen - 1),
-          cells, sizeof cells);
-    } else {
-      for (int32_t column = 0; column < kGlyphColumns + 2; ++column)
-        raster.plot(pen - 1 + column, y + row, cells[column]);
-    }
+    // Inside the raster, so the index fits size_t.
+    std::memcpy(raster.pixels + static_cast<size_t>(y + row) * static_cast<size_t>(raster.width) +
+                    static_cast<size_t>(left + first),
+                cells + first, static_cast<size_t>(past - first));
   }
 }
 
@@ -428,45 +351,24 @@ void draw_circle(const Raster &raster, uint32_t diameter, int64_t x, int64_t y, 
     raster.plot(x + 1, y + 1, colour);
     return;
   }
-  // The sizes in 32 bits: each is at most the diameter.
-  const uint32_t half = diameter / 2;
-  const uint32_t edge = half + static_cast<uint32_t>(kEdgeAdjustment[(diameter - 3) % 4]);
-  const uint32_t corner = (diameter - edge) / 2 + 1;
-  const uint32_t diagonal = corner > 2 ? corner - 2 : 0;
-  const int64_t even = diameter % 2 == 0, edge_even = edge % 2 == 0;
+  const int64_t d = diameter;
+  const int64_t half = d / 2;
+  const int64_t edge = half + kEdgeAdjustment[(d - 3) % 4];
+  const int64_t corner = (d + 2 - edge) / 2;
+  const int64_t diagonal = corner > 2 ? corner - 2 : 0;
   // Even sizes put the anchor at the top-left of the four central pixels.
-  const int64_t left = x - half + even, top = y - half + even;
-  const int64_t right = left + diameter - 1, bottom = top + diameter - 1;
-  const int64_t edge_x = x - edge / 2 + edge_even, edge_y = y - edge / 2 + edge_even;
+  const int64_t left = x - half + (d % 2 == 0), top = y - half + (d % 2 == 0);
+  const int64_t right = left + d - 1, bottom = top + d - 1;
+  const int64_t edge_x = x - edge / 2 + (edge % 2 == 0), edge_y = y - edge / 2 + (edge % 2 == 0);
   const int64_t edge_y_last = edge_y + edge - 1;
 
-  if (raster.has_column(left) && raster.has_column(right) && raster.has_row(top) &&
-      raster.has_row(bottom)) {
-    // The whole figure lies inside: positions and indices fit size_t, and no run is narrowed.
-    // The same runs as below, in the same order.
-    const auto width = static_cast<size_t>(raster.width);
-    const size_t west = static_cast<size_t>(edge_y) * width + static_cast<size_t>(left);
-    const size_t east = west + (diameter - 1), west_last = west + (edge - 1) * width;
-    const size_t top_edge = static_cast<size_t>(top) * width + static_cast<size_t>(edge_x);
-    uint8_t *const pixels = raster.pixels;
-    write_run(pixels, top_edge, edge, 1, colour);
-    write_run(pixels, top_edge + (diameter - 1) * width, edge, 1, colour);
-    write_run(pixels, west, edge, width, colour);
-    write_run(pixels, east, edge, width, colour);
-    if (diagonal == 0) return;
-    write_run(pixels, west - width + 1, diagonal, 1 - width, colour);
-    write_run(pixels, east - width - 1, diagonal, 0 - width - 1, colour);
-    write_run(pixels, west_last + width + 1, diagonal, width + 1, colour);
-    write_run(pixels, west_last + width + diameter - 2, diagonal, width - 1, colour);
-    return;
-  }
   // Edges first, then the four diagonal runs; each j of a diagonal is one step of its run.
   const struct {
     int64_t x, y;
   } starts[] = {{edge_x, top},  {edge_x, bottom}, {left, edge_y},      {right, edge_y},
                 {left, edge_y}, {right, edge_y},  {left, edge_y_last}, {right, edge_y_last}};
   const Steps along_edge{0, edge};
-  const Steps along_diagonal{1, int64_t{diagonal} + 1};
+  const Steps along_diagonal{1, diagonal + 1};
   // Unrolled where speed counts, each run then sees its constant steps: a third fewer
   // instructions per circle. Builds for size keep the loop.
   const int8_t(*steps)[2] = kCircleSteps;
@@ -486,8 +388,8 @@ extern "C" {
 
 void kel_image_draw_line(uint8_t *buf, int32_t height, int32_t width, int32_t x0, int32_t y0,
                          int32_t x1, int32_t y1, uint8_t colour) {
-  const Raster raster{buf, height, width};
-  if (!draw_line_inside(raster, x0, y0, x1, y1, colour)) draw_line(raster, x0, y0, x1, y1, colour);
+  if (height <= 0 || width <= 0) return;
+  draw_line(Raster{buf, height, width}, x0, y0, x1, y1, colour);
 }
 
 void kel_image_draw_triangle(uint8_t *buf, int32_t height, int32_t width, int32_t x0, int32_t y0,
@@ -499,16 +401,19 @@ void kel_image_draw_triangle(uint8_t *buf, int32_t height, int32_t width, int32_
 
 void kel_image_draw_rectangle(uint8_t *buf, int32_t height, int32_t width, int32_t x, int32_t y,
                               uint32_t rect_width, uint32_t rect_height, uint8_t colour) {
+  if (height <= 0 || width <= 0) return;
   draw_rectangle(Raster{buf, height, width}, x, y, rect_width, rect_height, colour);
 }
 
 void kel_image_draw_number(uint8_t *buf, int32_t height, int32_t width, int32_t value,
                            uint8_t min_digits, int32_t x, int32_t y, uint8_t colour) {
+  if (height <= 0 || width <= 0) return;
   draw_number(Raster{buf, height, width}, value, min_digits, x, y, colour);
 }
 
 void kel_image_draw_circle(uint8_t *buf, int32_t height, int32_t width, uint32_t diameter,
                            int32_t x, int32_t y, uint8_t colour) {
+  if (height <= 0 || width <= 0) return;
   draw_circle(Raster{buf, height, width}, diameter, x, y, colour);
 }
 

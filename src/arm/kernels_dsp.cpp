@@ -1,0 +1,109 @@
+// The hot rows on the Arm DSP extension (SIMD32: four bytes in one 32-bit register), for the
+// Cortex-M4, M7, M33 and M55: compile-time entries of the kernel table where the target has it.
+// Each does the whole words of its row, or declines the row, and returns the pixels done; the
+// plain body finishes. Words are read and written with plain loads and stores, which these cores
+// take at any alignment.
+//
+// The per-byte compares go through the GE flags: usub8 of (pixel ^ key) and 0x01010101 sets a
+// byte's flag exactly where the pixel differs from the key, and sel then takes that byte from its
+// first operand, the rest from its second.
+#include "kernels.h"
+
+#if KEL_ARM_DSP
+#include <arm_acle.h>
+
+#include <cstring>
+
+namespace kel {
+namespace dsp {
+namespace {
+
+constexpr uint32_t kOnes = 0x01010101u;
+
+uint32_t load(const uint8_t *at) {
+  uint32_t word;
+  std::memcpy(&word, at, sizeof word);
+  return word;
+}
+
+void store(uint8_t *at, uint32_t word) {
+  std::memcpy(at, &word, sizeof word);
+}
+
+// The pixels of a row's whole words.
+size_t whole_words(size_t count) {
+  return count & ~size_t{3};
+}
+
+// Sets each byte's GE flag where the byte of `pixels` differs from the key's (keys = key * kOnes).
+void flag_other_than(uint32_t pixels, uint32_t keys) {
+  __usub8(pixels ^ keys, kOnes);
+}
+
+}  // namespace
+
+// Each loop runs from its first word to `end`, pointers stepping four bytes: a compare and a
+// branch per word, which is all the loop costs.
+
+size_t mask(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  const size_t done = whole_words(count);
+  const uint32_t keys = key * kOnes;
+  for (const uint8_t *const end = in + done; in != end; in += 4, out += 4) {
+    flag_other_than(load(in), keys);
+    store(out, __sel(kOnes, 0));
+  }
+  return done;
+}
+
+size_t blend(const uint8_t *in, size_t count, uint8_t *out) {
+  const size_t done = whole_words(count);
+  for (const uint8_t *const end = in + done; in != end; in += 4, out += 4) {
+    store(out, __uhadd8(load(out), load(in)));
+  }
+  return done;
+}
+
+size_t paste_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  const size_t done = whole_words(count);
+  const uint32_t keys = key * kOnes;
+  for (const uint8_t *const end = in + done; in != end; in += 4, out += 4) {
+    const uint32_t pixels = load(in);
+    flag_other_than(pixels, keys);
+    store(out, __sel(pixels, load(out)));
+  }
+  return done;
+}
+
+size_t blend_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  const size_t done = whole_words(count);
+  const uint32_t keys = key * kOnes;
+  for (const uint8_t *const end = in + done; in != end; in += 4, out += 4) {
+    const uint32_t pixels = load(in), under = load(out);
+    flag_other_than(pixels, keys);
+    // uhadd8 leaves the GE flags as usub8 set them.
+    store(out, __sel(__uhadd8(under, pixels), under));
+  }
+  return done;
+}
+
+// usada8 adds the four bytes; uxtb16 spreads bytes 0 and 2 (then 1 and 3) into halfwords, and
+// smlad adds both halfwords' squares. Both sums wrap modulo 2^32 like the plain ones.
+size_t sum_pixels(const uint8_t *pixels, size_t count, PixelSums *sums) {
+  const size_t done = whole_words(count);
+  uint32_t sum = sums->sum, sum_of_squares = sums->sum_of_squares;
+  for (const uint8_t *const end = pixels + done; pixels != end; pixels += 4) {
+    const uint32_t word = load(pixels);
+    const uint32_t even = __uxtb16(word), odd = __uxtb16(word >> 8);
+    sum = __usada8(word, 0, sum);
+    sum_of_squares =
+        static_cast<uint32_t>(__smlad(even, even, static_cast<int32_t>(sum_of_squares)));
+    sum_of_squares = static_cast<uint32_t>(__smlad(odd, odd, static_cast<int32_t>(sum_of_squares)));
+  }
+  *sums = PixelSums{sum, sum_of_squares};
+  return done;
+}
+
+}  // namespace dsp
+}  // namespace kel
+
+#endif  // KEL_ARM_DSP
