@@ -128,7 +128,8 @@ struct LineInterior {
 // minor_direction, nondecreasing along the line) reaches target; steps.end if none. The offset
 // floor(i * minor / major) reaches t > 0 exactly when i * minor >= t * major, so the step is ceil(t
 // * major / minor). Both t and major_length are below 2^32, so the product stays below 2^64.
-int64_t first_step_reaching(const LineInterior &line, Steps steps, int64_t target) {
+__attribute__((noinline)) int64_t first_step_reaching(const LineInterior &line, Steps steps,
+                                                      int64_t target) {
   const int64_t needed = target - line.minor_direction * line.minor_start;
   if (needed <= 0) return steps.begin;
   if (line.minor_length == 0) return steps.end;
@@ -261,8 +262,6 @@ constexpr uint32_t kGlyphMasks[10] = {
     0x6996996,  // 8
     0x698E996,  // 9
 };
-// Place values of the nine digit positions, units first.
-constexpr int32_t kPlaceValues[9] = {1, 10, 100, 1000, 10000, 100000, 1000000, 10000000, 100000000};
 // The most a nine-digit display shows. Larger magnitudes show as all nines rather than as a
 // wrong number, and never index past the glyph table.
 constexpr int32_t kLargestShown = 999999999;
@@ -316,8 +315,8 @@ void draw_number(const Raster &raster, int32_t value, uint8_t min_digits, int64_
     pen += kGlyphAdvance;
   }
   bool started = false;
-  for (int32_t position = 9; position >= 1; --position) {
-    const int32_t place = kPlaceValues[position - 1];
+  int32_t place = 100000000;  // of the ninth digit, the most shown
+  for (int32_t position = 9; position >= 1; --position, place /= 10) {
     const int32_t digit = rest / place;
     if (digit != 0) {
       started = true;
@@ -334,10 +333,14 @@ void draw_number(const Raster &raster, int32_t value, uint8_t min_digits, int64_
 
 // Straight edge length minus floor(d / 2), indexed by (d - 3) % 4.
 constexpr int8_t kEdgeAdjustment[4] = {0, 0, 1, -1};
-// The directions of an octagon's runs: top and bottom edges, left and right edges, then the
-// diagonals from the left and right edges up and down.
-constexpr int8_t kCircleSteps[8][2] = {{1, 0},  {1, 0},   {0, 1}, {0, 1},
-                                       {1, -1}, {-1, -1}, {1, 1}, {-1, 1}};
+// The runs of an octagon: edges first (top, bottom, left, right), then the diagonals from the
+// left and right edges up and down. Each has its steps and its start, as indices into the
+// columns {edge_x, left, right} and the rows {top, bottom, edge_y, edge_y_last}.
+struct CircleRun {
+  int8_t step_x, step_y, column, row;
+};
+constexpr CircleRun kCircleRuns[8] = {{1, 0, 0, 0},  {1, 0, 0, 1},   {0, 1, 1, 2}, {0, 1, 2, 2},
+                                      {1, -1, 1, 2}, {-1, -1, 2, 2}, {1, 1, 1, 3}, {-1, 1, 2, 3}};
 
 // An octagon that fills a d x d box: four straight edges of L pixels and four diagonal runs of
 // s pixels, with L + 2 * (s + 1) = d.
@@ -351,34 +354,30 @@ void draw_circle(const Raster &raster, uint32_t diameter, int64_t x, int64_t y, 
     raster.plot(x + 1, y + 1, colour);
     return;
   }
-  const int64_t d = diameter;
-  const int64_t half = d / 2;
-  const int64_t edge = half + kEdgeAdjustment[(d - 3) % 4];
-  const int64_t corner = (d + 2 - edge) / 2;
-  const int64_t diagonal = corner > 2 ? corner - 2 : 0;
+  // The sizes in 32 bits: each is at most the diameter.
+  const uint32_t half = diameter / 2;
+  const uint32_t edge = half + static_cast<uint32_t>(kEdgeAdjustment[(diameter - 3) % 4]);
+  const uint32_t corner = (diameter - edge) / 2 + 1;
+  const uint32_t diagonal = corner > 2 ? corner - 2 : 0;
+  const int64_t even = diameter % 2 == 0, edge_even = edge % 2 == 0;
   // Even sizes put the anchor at the top-left of the four central pixels.
-  const int64_t left = x - half + (d % 2 == 0), top = y - half + (d % 2 == 0);
-  const int64_t right = left + d - 1, bottom = top + d - 1;
-  const int64_t edge_x = x - edge / 2 + (edge % 2 == 0), edge_y = y - edge / 2 + (edge % 2 == 0);
+  const int64_t left = x - half + even, top = y - half + even;
+  const int64_t right = left + diameter - 1, bottom = top + diameter - 1;
+  const int64_t edge_x = x - edge / 2 + edge_even, edge_y = y - edge / 2 + edge_even;
   const int64_t edge_y_last = edge_y + edge - 1;
 
-  // Edges first, then the four diagonal runs; each j of a diagonal is one step of its run.
-  const struct {
-    int64_t x, y;
-  } starts[] = {{edge_x, top},  {edge_x, bottom}, {left, edge_y},      {right, edge_y},
-                {left, edge_y}, {right, edge_y},  {left, edge_y_last}, {right, edge_y_last}};
+  // Each j of a diagonal is one step of its run.
+  const int64_t columns[] = {edge_x, left, right}, rows[] = {top, bottom, edge_y, edge_y_last};
   const Steps along_edge{0, edge};
-  const Steps along_diagonal{1, diagonal + 1};
+  const Steps along_diagonal{1, int64_t{diagonal} + 1};
   // Unrolled where speed counts, each run then sees its constant steps: a third fewer
   // instructions per circle. Builds for size keep the loop.
-  const int8_t(*steps)[2] = kCircleSteps;
 #if !KEL_SMALL_BUILD
 #pragma GCC unroll 8
 #endif
-  for (const auto &start : starts) {
-    const Steps along = steps < kCircleSteps + 4 ? along_edge : along_diagonal;
-    draw_run(raster, start.x, start.y, (*steps)[0], (*steps)[1], along, colour);
-    ++steps;
+  for (const CircleRun &run : kCircleRuns) {
+    draw_run(raster, columns[run.column], rows[run.row], run.step_x, run.step_y,
+             &run < kCircleRuns + 4 ? along_edge : along_diagonal, colour);
   }
 }
 
