@@ -259,7 +259,11 @@ KEL_API void kel_get_mask(const uint8_t *src, uint32_t height, uint32_t width, i
  * that value transparent (the destination keeps its value there); 256 .. 65535 makes none
  * transparent. Rows are visited top to bottom and columns left to right, each source pixel read
  * just before its destination pixel is written, and the result is that of this order also when
- * the two rasters overlap in memory. Nothing is allocated. */
+ * the two rasters overlap in memory. Nothing is allocated.
+ * A transparent pixel leaves its destination byte's value unchanged, but on CPUs without byte-
+ * masked stores (all but AVX-512 among x86 ones, and Arm's NEON) the byte may be read and written
+ * back with that same value, a vector at a time: as with any call, no other thread may write the
+ * destination rows under the source while it runs. */
 
 /* Paste: every visible, non-transparent source pixel replaces its destination pixel. */
 KEL_API void kel_image_draw_image(uint8_t *dst, int32_t dst_height, int32_t dst_width,

@@ -205,4 +205,50 @@ TEST(AllocationFailure, EveryAllocationFailsCleanly) {
   }
 }
 
+// The heap-free twins take no memory at all; given a buffer one byte short they write nothing
+// and call nothing outside, and given enough they make the same calls as the heap-using ones.
+TEST(AllocationFailure, HeapFreeCallsTakeNoMemory) {
+  const Bytes src(5 * 9, 7);
+  kel_canvas canvas;
+  Seen sized;
+  sized.cos = sized.sin = 1;
+  size_t bytes = 0;
+  EXPECT_EQ(armed(-1, [&] { bytes = kel_rotation_canvas(5, 9, 30, &canvas); }), sized);
+  ASSERT_EQ(bytes, size_t(canvas.height) * size_t(canvas.width));
+  Bytes pixels(bytes, 1);
+  EXPECT_EQ(armed(-1,
+                  [&] {
+                    kel_image_rotate_into(src.data(), 5, 9, 30, &canvas, pixels.data(), bytes - 1);
+                  }),
+            Seen{});
+  EXPECT_EQ(pixels, Bytes(bytes, 1));
+  EXPECT_EQ(
+      armed(-1,
+            [&] { kel_image_rotate_into(src.data(), 5, 9, 30, &canvas, pixels.data(), bytes); }),
+      sized);
+
+  const uint16_t h = 20, w = 27;
+  Bytes mask(size_t{h} * w, 1), out(size_t{h} * w, 9);
+  mask[100] = 0;
+  const size_t scratch_bytes = kel_mask_image_scratch_size(h, w);
+  Bytes scratch(scratch_bytes);
+  EXPECT_EQ(armed(-1,
+                  [&] {
+                    kel_mask_image_into(src.data(), h, w, mask.data(), out.data(), scratch.data(),
+                                        scratch_bytes - 1);
+                  }),
+            Seen{});
+  EXPECT_EQ(out, Bytes(size_t{h} * w, 9));
+  Seen filled;
+  filled.blur = 2, filled.scale = 1;
+  Bytes source(size_t{h} * w, 50);
+  EXPECT_EQ(armed(-1,
+                  [&] {
+                    kel_mask_image_into(source.data(), h, w, mask.data(), out.data(),
+                                        scratch.data(), scratch_bytes);
+                  }),
+            filled);
+  EXPECT_EQ(kel_mask_image_scratch_size(65529, 1), 0u);
+}
+
 }  // namespace

@@ -188,6 +188,27 @@ __attribute__((target("avx512vnni"))) void sum_blocks(const uint8_t *pixels, siz
 }
 #endif
 
+#if KEL_STATISTICS_VECTORS
+// The pixels of the lower and upper half of v, widened to 16 bits. A zip interleaves in memory
+// order, and the byte of a 16-bit lane that comes first in memory is its low one only on
+// little-endian CPUs: elsewhere the zeros go first.
+#if defined(__BYTE_ORDER__) && __BYTE_ORDER__ == __ORDER_BIG_ENDIAN__
+constexpr bool kLowByteFirst = false;
+#else
+constexpr bool kLowByteFirst = true;
+#endif
+
+template <class D16>
+hn::Vec<D16> widen_lower(D16 d16, V8 v, V8 zero) {
+  return kLowByteFirst ? hn::ZipLower(d16, v, zero) : hn::ZipLower(d16, zero, v);
+}
+
+template <class D16>
+hn::Vec<D16> widen_upper(D16 d16, V8 v, V8 zero) {
+  return kLowByteFirst ? hn::ZipUpper(d16, v, zero) : hn::ZipUpper(d16, zero, v);
+}
+#endif
+
 // Both sums are wanted modulo 2^32 only, so 32-bit lanes may wrap: the lanes' total is still
 // the true total modulo 2^32. The plain sum goes through 64-bit lanes, which the byte sums of
 // SumsOf8 fill directly. Returns how many pixels it added: whole vectors, after a head that
@@ -215,8 +236,8 @@ size_t SumPixels(const uint8_t *pixels, size_t count, PixelSums *sums) {
   for (; count - i >= lanes; i += lanes) {
     const V8 v = hn::LoadU(d, pixels + i);
     vector_sums = hn::Add(vector_sums, hn::SumsOf8(v));
-    squares = hn::Add(squares, pair_squares(d16, hn::ZipLower(d16, v, zero)));
-    squares = hn::Add(squares, pair_squares(d16, hn::ZipUpper(d16, v, zero)));
+    squares = hn::Add(squares, pair_squares(d16, widen_lower(d16, v, zero)));
+    squares = hn::Add(squares, pair_squares(d16, widen_upper(d16, v, zero)));
   }
   result.sum += static_cast<uint32_t>(sum_of_lanes(d64, vector_sums));
   // The 32-bit lanes are added in 64-bit pairs first: a reduction of 32-bit lanes may be signed
