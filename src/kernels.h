@@ -147,9 +147,38 @@ size_t sum_pixels(const uint8_t *pixels, size_t count, PixelSums *sums);
 }  // namespace dsp
 #endif
 
+#if KEL_ARM_MVE
+namespace mve {
+size_t brighten(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
+size_t darken(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
+size_t mask(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t copy(const uint8_t *in, size_t count, uint8_t *out);
+size_t blend(const uint8_t *in, size_t count, uint8_t *out);
+size_t paste_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t blend_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t sum_pixels(const uint8_t *pixels, size_t count, PixelSums *sums);
+}  // namespace mve
+#endif
+
 // The table this build runs, known when compiling: each routine then calls its own kernels
 // directly, and a firmware that calls one routine carries only that routine's kernels.
-#if KEL_ARM_DSP
+#if KEL_ARM_MVE
+inline constexpr Kernels kCompiledKernels = {"MVE",
+                                             mve::brighten,
+                                             mve::darken,
+                                             mve::mask,
+                                             mve::copy,
+                                             mve::blend,
+                                             mve::paste_keyed,
+                                             mve::blend_keyed,
+                                             plain::prefetch_for_writing,
+                                             plain::count_bins,
+                                             mve::sum_pixels,
+                                             plain::rotate_u8,
+                                             plain::rotate_i8,
+                                             plain::rotate_i8_nn,
+                                             plain::nonzero_tail};
+#elif KEL_ARM_DSP
 inline constexpr Kernels kCompiledKernels = {"DSP",
                                              plain::brighten,
                                              plain::darken,

@@ -42,8 +42,10 @@ struct Tally {
             const uint8_t *expected, const uint8_t *got, size_t n, size_t origin) {
     for (size_t i = 0; i < n; ++i) {
       if (expected[i] != got[i]) {
-        printf("FAIL %s %s, %s, length %zu, input %zu bytes off: byte %lld expected %u got %u\n",
-               table, kernel, what, length, shift,
+        // Sizes printed as unsigned long: newlib for microcontrollers may not know %zu.
+        printf("FAIL %s %s, %s, length %lu, input %lu bytes off: byte %lld expected %u got %u\n",
+               table, kernel, what, static_cast<unsigned long>(length),
+               static_cast<unsigned long>(shift),
                static_cast<long long>(i) - static_cast<long long>(origin), expected[i], got[i]);
         ++failed;
         return;
@@ -134,8 +136,8 @@ void sweep_rows(const kel::Kernels &k, Tally &tally) {
           const size_t done = row.run(k, in + kGuard + shift, length, got + kGuard, param);
           snprintf(what, sizeof what, "%s, setting %d", kPatternNames[p], param);
           if (done > length) {
-            printf("FAIL %s %s, %s, length %zu: did %zu pixels\n", k.name, row.name, what, length,
-                   done);
+            printf("FAIL %s %s, %s, length %lu: did %lu pixels\n", k.name, row.name, what,
+                   static_cast<unsigned long>(length), static_cast<unsigned long>(done));
             ++tally.failed;
             continue;
           }
@@ -176,7 +178,7 @@ void sweep_statistics(const kel::Kernels &k, Tally &tally) {
         kel::kPlainKernels.count_bins(at + done, length - done, bits, got);
         kel::kPlainKernels.count_bins(at, length, bits, expected);
         char what[32];
-        snprintf(what, sizeof what, "%u bits", bits);
+        snprintf(what, sizeof what, "%u bits", static_cast<unsigned>(bits));
         tally.same(k.name, "count_bins", what, length, shift,
                    reinterpret_cast<const uint8_t *>(expected),
                    reinterpret_cast<const uint8_t *>(got), sizeof expected, 0);

@@ -42,47 +42,59 @@ void flag_other_than(uint32_t pixels, uint32_t keys) {
 
 }  // namespace
 
-// Each loop runs from its first word to `end`, pointers stepping four bytes: a compare and a
-// branch per word, which is all the loop costs.
+// Each loop runs from its first word to `end`, pointers stepping four bytes, and tests at its
+// foot: a compare and a branch per word, which is all the loop costs.
 
 size_t mask(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   const size_t done = whole_words(count);
+  if (done == 0) return 0;
   const uint32_t keys = key * kOnes;
-  for (const uint8_t *const end = in + done; in != end; in += 4, out += 4) {
+  const uint8_t *const end = in + done;
+  do {
     flag_other_than(load(in), keys);
     store(out, __sel(kOnes, 0));
-  }
+    in += 4, out += 4;
+  } while (in != end);
   return done;
 }
 
 size_t blend(const uint8_t *in, size_t count, uint8_t *out) {
   const size_t done = whole_words(count);
-  for (const uint8_t *const end = in + done; in != end; in += 4, out += 4) {
+  if (done == 0) return 0;
+  const uint8_t *const end = in + done;
+  do {
     store(out, __uhadd8(load(out), load(in)));
-  }
+    in += 4, out += 4;
+  } while (in != end);
   return done;
 }
 
 size_t paste_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   const size_t done = whole_words(count);
+  if (done == 0) return 0;
   const uint32_t keys = key * kOnes;
-  for (const uint8_t *const end = in + done; in != end; in += 4, out += 4) {
+  const uint8_t *const end = in + done;
+  do {
     const uint32_t pixels = load(in);
     flag_other_than(pixels, keys);
     store(out, __sel(pixels, load(out)));
-  }
+    in += 4, out += 4;
+  } while (in != end);
   return done;
 }
 
 size_t blend_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   const size_t done = whole_words(count);
+  if (done == 0) return 0;
   const uint32_t keys = key * kOnes;
-  for (const uint8_t *const end = in + done; in != end; in += 4, out += 4) {
+  const uint8_t *const end = in + done;
+  do {
     const uint32_t pixels = load(in), under = load(out);
     flag_other_than(pixels, keys);
     // uhadd8 leaves the GE flags as usub8 set them.
     store(out, __sel(__uhadd8(under, pixels), under));
-  }
+    in += 4, out += 4;
+  } while (in != end);
   return done;
 }
 
@@ -90,15 +102,18 @@ size_t blend_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
 // smlad adds both halfwords' squares. Both sums wrap modulo 2^32 like the plain ones.
 size_t sum_pixels(const uint8_t *pixels, size_t count, PixelSums *sums) {
   const size_t done = whole_words(count);
+  if (done == 0) return 0;
   uint32_t sum = sums->sum, sum_of_squares = sums->sum_of_squares;
-  for (const uint8_t *const end = pixels + done; pixels != end; pixels += 4) {
+  const uint8_t *const end = pixels + done;
+  do {
     const uint32_t word = load(pixels);
     const uint32_t even = __uxtb16(word), odd = __uxtb16(word >> 8);
     sum = __usada8(word, 0, sum);
     sum_of_squares =
         static_cast<uint32_t>(__smlad(even, even, static_cast<int32_t>(sum_of_squares)));
     sum_of_squares = static_cast<uint32_t>(__smlad(odd, odd, static_cast<int32_t>(sum_of_squares)));
-  }
+    pixels += 4;
+  } while (pixels != end);
   *sums = PixelSums{sum, sum_of_squares};
   return done;
 }
