@@ -12,7 +12,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
-#include <limits>
 #include <utility>
 
 #include "kel_images.h"
@@ -52,21 +51,20 @@ struct Steps {
   int64_t begin, end;
 
   bool empty() const { return begin >= end; }
-  Steps intersect(Steps other) const {
-    return {std::max(begin, other.begin), std::min(end, other.end)};
+
+  // Keeps the steps k at which the coordinate start + direction * k (direction -1, 0 or +1)
+  // lies in [0, extent); none when extent <= 0.
+  void keep_inside(int64_t start, int32_t direction, int32_t extent) {
+    int64_t low = -start, high = extent - start;  // going forward
+    if (direction < 0) low = start - extent + 1, high = start + 1;
+    if (direction == 0) {
+      if (start >= 0 && start < extent) return;
+      low = high = 0;
+    }
+    begin = std::max(begin, low);
+    end = std::min(end, high);
   }
 };
-
-// The steps k at which the coordinate start + direction * k (direction -1, 0 or +1) lies in
-// [0, extent). Empty when extent <= 0.
-Steps steps_inside(int64_t start, int32_t direction, int32_t extent) {
-  if (direction > 0) return {-start, extent - start};
-  if (direction < 0) return {start - extent + 1, start + 1};
-  if (start >= 0 && start < extent) {
-    return {std::numeric_limits<int64_t>::min(), std::numeric_limits<int64_t>::max()};
-  }
-  return {0, 0};
-}
 
 // count >= 1 pixels from buffer index `first` on, `stride` apart (modulo 2^32 on a 32-bit
 // core, so a negative stride wraps), all inside the raster: a row (stride 1) is one memset.
@@ -85,9 +83,10 @@ __attribute__((noinline)) void write_run(uint8_t *pixels, size_t first, size_t c
 // The pixels (x + k * step_x, y + k * step_y) for the steps k in `along`, step_x and step_y each
 // -1, 0 or +1: a row, a column or a diagonal. Those inside form one range of k.
 void draw_run(const Raster &raster, int64_t x, int64_t y, int32_t step_x, int32_t step_y,
-              Steps along, uint8_t colour) {
-  const Steps inside = along.intersect(steps_inside(x, step_x, raster.width))
-                           .intersect(steps_inside(y, step_y, raster.height));
+              const Steps &along, uint8_t colour) {
+  Steps inside = along;
+  inside.keep_inside(x, step_x, raster.width);
+  inside.keep_inside(y, step_y, raster.height);
   if (inside.empty()) return;
   // Inside the raster, positions and buffer indices fit size_t (and 32 bits on a 32-bit core).
   const auto begin = static_cast<size_t>(inside.begin);
@@ -128,7 +127,7 @@ struct LineInterior {
 // minor_direction, nondecreasing along the line) reaches target; steps.end if none. The offset
 // floor(i * minor / major) reaches t > 0 exactly when i * minor >= t * major, so the step is ceil(t
 // * major / minor). Both t and major_length are below 2^32, so the product stays below 2^64.
-__attribute__((noinline)) int64_t first_step_reaching(const LineInterior &line, Steps steps,
+__attribute__((noinline)) int64_t first_step_reaching(const LineInterior &line, const Steps &steps,
                                                       int64_t target) {
   const int64_t needed = target - line.minor_direction * line.minor_start;
   if (needed <= 0) return steps.begin;
@@ -144,9 +143,8 @@ __attribute__((noinline)) int64_t first_step_reaching(const LineInterior &line, 
 Steps interior_steps_inside(const LineInterior &line, const Raster &raster) {
   const int32_t major_extent = line.steep ? raster.height : raster.width;
   const int32_t minor_extent = line.steep ? raster.width : raster.height;
-  const Steps interior{1, static_cast<int64_t>(line.major_length)};
-  const Steps steps =
-      interior.intersect(steps_inside(line.major_start, line.major_direction, major_extent));
+  Steps steps{1, static_cast<int64_t>(line.major_length)};
+  steps.keep_inside(line.major_start, line.major_direction, major_extent);
   if (steps.empty()) return steps;
   // Inside on the minor axis means a progress in [first, past): [0, extent) going forward,
   // [1 - extent, 1) going backward.
