@@ -139,6 +139,8 @@ const Kernels &kernels();
 
 #if KEL_ARM_DSP
 namespace dsp {
+size_t brighten(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
+size_t darken(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
 size_t mask(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 size_t blend(const uint8_t *in, size_t count, uint8_t *out);
 size_t paste_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
@@ -156,6 +158,7 @@ size_t copy(const uint8_t *in, size_t count, uint8_t *out);
 size_t blend(const uint8_t *in, size_t count, uint8_t *out);
 size_t paste_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 size_t blend_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t count_bins(const uint8_t *pixels, size_t count, uint32_t bits, uint32_t *hist);
 size_t sum_pixels(const uint8_t *pixels, size_t count, PixelSums *sums);
 }  // namespace mve
 #endif
@@ -172,7 +175,7 @@ inline constexpr Kernels kCompiledKernels = {"MVE",
                                              mve::paste_keyed,
                                              mve::blend_keyed,
                                              plain::prefetch_for_writing,
-                                             plain::count_bins,
+                                             mve::count_bins,
                                              mve::sum_pixels,
                                              plain::rotate_u8,
                                              plain::rotate_i8,
@@ -180,8 +183,8 @@ inline constexpr Kernels kCompiledKernels = {"MVE",
                                              plain::nonzero_tail};
 #elif KEL_ARM_DSP
 inline constexpr Kernels kCompiledKernels = {"DSP",
-                                             plain::brighten,
-                                             plain::darken,
+                                             dsp::brighten,
+                                             dsp::darken,
                                              dsp::mask,
                                              plain::copy,
                                              dsp::blend,
