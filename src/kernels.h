@@ -160,6 +160,9 @@ size_t paste_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 size_t blend_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
 size_t count_bins(const uint8_t *pixels, size_t count, uint32_t bits, uint32_t *hist);
 size_t sum_pixels(const uint8_t *pixels, size_t count, PixelSums *sums);
+size_t rotate_u8(const RotationRun &run, uint8_t *out);
+size_t rotate_i8(const RotationRun &run, int8_t *out);
+size_t rotate_i8_nn(const RotationRun &run, int8_t *out);
 }  // namespace mve
 #endif
 
@@ -177,9 +180,9 @@ inline constexpr Kernels kCompiledKernels = {"MVE",
                                              plain::prefetch_for_writing,
                                              mve::count_bins,
                                              mve::sum_pixels,
-                                             plain::rotate_u8,
-                                             plain::rotate_i8,
-                                             plain::rotate_i8_nn,
+                                             mve::rotate_u8,
+                                             mve::rotate_i8,
+                                             mve::rotate_i8_nn,
                                              plain::nonzero_tail};
 #elif KEL_ARM_DSP
 inline constexpr Kernels kCompiledKernels = {"DSP",

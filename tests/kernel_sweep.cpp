@@ -214,6 +214,23 @@ void sweep_tails(const kel::Kernels &k, Tally &tally) {
 }
 
 // Runs through sources of a few shapes along the turns of several angles, every position inside.
+// One run on table k's entry, the plain body finishing it, against the plain body alone.
+template <typename Pixel>
+void check_run(const kel::Kernels &k, kel::RotationRow<Pixel> kel::Kernels::*entry,
+               const char *name, const kel::RotationRun &run, const char *what, Tally &tally) {
+  Pixel expected[kLongest + kGuard], got[kLongest + kGuard];
+  memset(expected, kGuardByte, sizeof expected), memset(got, kGuardByte, sizeof got);
+  (kel::kPlainKernels.*entry)(run, expected);
+  const size_t done = (k.*entry)(run, got);
+  kel::RotationRun rest = run;
+  rest.x += int64_t{run.step_x} * static_cast<int64_t>(done);
+  rest.y += int64_t{run.step_y} * static_cast<int64_t>(done);
+  rest.count -= done;
+  if (done <= run.count) (kel::kPlainKernels.*entry)(rest, got + done);
+  tally.same(k.name, name, what, run.count, 0, reinterpret_cast<const uint8_t *>(expected),
+             reinterpret_cast<const uint8_t *>(got), sizeof expected, 0);
+}
+
 template <typename Pixel>
 void sweep_rotation(const kel::Kernels &k, kel::RotationRow<Pixel> kel::Kernels::*entry,
                     const char *name, int64_t reach, Tally &tally) {
@@ -243,20 +260,31 @@ void sweep_rotation(const kel::Kernels &k, kel::RotationRow<Pixel> kel::Kernels:
              x += cos, y += sin) {
           ++run.count;
         }
-        Pixel expected[kLongest + kGuard], got[kLongest + kGuard];
-        memset(expected, kGuardByte, sizeof expected), memset(got, kGuardByte, sizeof got);
-        (kel::kPlainKernels.*entry)(run, expected);
-        const size_t done = (k.*entry)(run, got);
-        kel::RotationRun rest = run;
-        rest.x += int64_t{cos} * static_cast<int64_t>(done);
-        rest.y += int64_t{sin} * static_cast<int64_t>(done);
-        rest.count -= done;
-        if (done <= run.count) (kel::kPlainKernels.*entry)(rest, got + done);
         char what[64];
         snprintf(what, sizeof what, "%lldx%lld angle %d start %d", static_cast<long long>(height),
                  static_cast<long long>(width), angle, start);
-        tally.same(k.name, name, what, run.count, 0, reinterpret_cast<const uint8_t *>(expected),
-                   reinterpret_cast<const uint8_t *>(got), sizeof expected, 0);
+        check_run(k, entry, name, run, what, tally);
+      }
+    }
+  }
+  // Totals just above a whole multiple of 2^28: a source of v with v + 1 at its odd columns of
+  // odd rows, read at fractions fx, fy past even whole points, gives v * 2^28 + fx * fy, which a
+  // signed run truncates toward zero to v + 1 when v is negative, however small fx * fy is.
+  constexpr int64_t kHeight = 4, kWidth = 40;
+  static const int kValues[] = {-128, -3, -1, 0, 2, 126};
+  static const int32_t kFractions[] = {0, 1, 5, 127, 16383};
+  for (const int v : kValues) {
+    for (int64_t y = 0; y < kHeight; ++y) {
+      for (int64_t x = 0; x < kWidth; ++x)
+        source[y * kWidth + x] = static_cast<uint8_t>(v + ((x & y & 1) != 0 ? 1 : 0));
+    }
+    for (const int32_t fx : kFractions) {
+      for (const int32_t fy : kFractions) {
+        const kel::RotationRun run{source, kHeight, kWidth, fx, 2 * 16384 + fy, 2 * 16384, 0, 19};
+        char what[64];
+        snprintf(what, sizeof what, "near whole %d, fractions %ld %ld", v, static_cast<long>(fx),
+                 static_cast<long>(fy));
+        check_run(k, entry, name, run, what, tally);
       }
     }
   }
