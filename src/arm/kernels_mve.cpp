@@ -32,8 +32,8 @@ uint32_t load_word(const uint8_t *at) {
 // Each loop runs from its first vector to `end`, pointers stepping sixteen bytes, and tests at
 // its foot.
 
-// min(pixel ^ key, 1): 0 exactly where the pixel is the key. (A compare's predicate would cost
-// three more instructions: GCC 12 moves it through a general register and back.)
+// min(pixel ^ key, 1): 0 exactly where the pixel is the key. (A compare's predicate costs more
+// here: GCC 12 moves it through a general register and back.)
 size_t mask(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
   const size_t done = whole_vectors(count);
   if (done == 0) return 0;
