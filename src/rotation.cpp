@@ -210,14 +210,17 @@ size_t resample_run(const kel::RotationRun &run, typename Policy::Pixel *out) {
 struct Resampling {
   uint8_t fill;   // the fill's byte
   int64_t reach;  // Policy::kReach
-  // Resamples a run on the chosen table, the plain body finishing it.
-  void (*run)(const kel::Kernels &chosen, kel::RotationRun run, void *out);
+  // Resamples a run: the chosen kernel first, the plain body finishing it.
+  void (*run)(kel::RotationRun run, void *out);
 };
 
+// The table is asked for each run rather than passed in, so that where it is known when
+// compiling the kernels are called directly.
 template <typename Policy>
-void run_on(const kel::Kernels &chosen, kel::RotationRun run, void *out) {
+void run_on(kel::RotationRun run, void *out) {
   auto *pixels = static_cast<typename Policy::Pixel *>(out);
-  const size_t done = (chosen.*Policy::kRun)(run, pixels);
+  const size_t done = (kel::kernels().*Policy::kRun)(run, pixels);
+  if (done >= run.count) return;
   run.x += int64_t{run.step_x} * static_cast<int64_t>(done);
   run.y += int64_t{run.step_y} * static_cast<int64_t>(done);
   run.count -= done;
@@ -236,14 +239,12 @@ void resample_canvas(const Resampling &how, const void *src, int64_t height, int
   // A whole part in [0, side - reach) is a fixed-point position in [0, (side - reach) * 16384).
   const int64_t x_high = (width - how.reach) * kOne;
   const int64_t y_high = (height - how.reach) * kOne;
-  const kel::Kernels &chosen = kel::kernels();
   for (int64_t r = 0; r < g.height; ++r) {
     const RowRun columns = row_run(g, b, r, x_high, y_high);
     if (columns.first >= columns.last) continue;
     uint8_t *out = canvas + static_cast<size_t>(r) * static_cast<size_t>(g.width) +
                    static_cast<size_t>(columns.first);
-    how.run(chosen,
-            {src, height, width, columns.x, columns.y, b.cos, b.sin,
+    how.run({src, height, width, columns.x, columns.y, b.cos, b.sin,
              static_cast<size_t>(columns.last - columns.first)},
             out);
   }

@@ -1,11 +1,12 @@
 // Our default smoothing and bilinear enlargement, the two image functions the masked fill
 // calls outside the library. Both work without heap and with a small, fixed amount of stack.
 //
-// The row loops are plain C++ written so that GCC's vectoriser (-O3, as in the Release build)
-// turns them into vector code on its own, 8-bit averages for the blur and 16-bit lanes for the
-// enlargement, with SSE2 on any x86-64 and NEON on aarch64. With Highway, image_filters_simd.cpp
-// has variants of them for wider instruction sets, picked at run time; the drivers here take
-// either set, and the plain loops are the reference the variants are tested against.
+// Every row loop is a kernel of the table in image_filters_simd.h. The plain bodies here are the
+// reference and finish every row; they are written so that GCC's vectoriser (-O3, as in the
+// Release build) turns them into vector code on its own, 8-bit averages for the blur and 16-bit
+// lanes for the enlargement, with SSE2 on any x86-64 and NEON on aarch64. With Highway,
+// image_filters_simd.cpp has variants for wider instruction sets, chosen at run time. Every
+// build runs the same drivers on the same bodies, so none of them computes a different result.
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
@@ -13,8 +14,9 @@
 #include "image_filters_simd.h"
 #include "kel_outside.h"
 
-// A build for size (MinSizeRel, as for microcontrollers) keeps shorter strips on the stack and
-// leaves out the one-sweep blur, which only makes a call faster.
+// A build for size (MinSizeRel, as for microcontrollers) keeps shorter strips on the stack. A
+// strip's length bounds the stack a call takes, never what it computes: every pixel of a strip
+// is found from the same neighbours whatever its length.
 #if KEL_SMALL_BUILD
 constexpr bool kSmallBuild = true;
 #else
@@ -33,7 +35,7 @@ size_t strip_length(size_t start, size_t total, size_t strip) {
 // Blur: [1 2 1] / 4 along the rows, then along the columns, edges clamped.
 // ---------------------------------------------------------------------------------------------
 
-// Columns handled at a time where a pass needs a copy of its input on the stack.
+// Columns handled at a time where the in-place blur keeps a copy of its input on the stack.
 constexpr size_t kBlurStrip = kSmallBuild ? 128 : 256;
 
 // (a + 2b + c + 2) >> 2: each pass rounds half up, so a constant raster stays constant. It is
@@ -51,95 +53,164 @@ uint8_t smooth(uint8_t before, uint8_t centre, uint8_t after) {
 
 namespace plain {
 
-void smooth_triples(const uint8_t *src, size_t count, uint8_t *dst) {
+size_t smooth_triples(const uint8_t *src, size_t count, uint8_t *dst) {
   for (size_t i = 0; i < count; ++i) dst[i] = smooth(src[i], src[i + 1], src[i + 2]);
+  return count;
 }
 
 // Both passes of one row: the horizontal pass of `row` goes to `lower`, and the vertical pass
 // of `centre`'s column turns `upper` (the pass of the row above) into the result; each column
 // needs its own three values only.
-void smooth_across_and_down(const uint8_t *row, size_t count, uint8_t *upper, const uint8_t *centre,
-                            uint8_t *lower) {
+size_t smooth_across_and_down(const uint8_t *row, size_t count, uint8_t *upper,
+                              const uint8_t *centre, uint8_t *lower) {
   for (size_t i = 0; i < count; ++i) {
     const uint8_t across = smooth(row[i], row[i + 1], row[i + 2]);
     lower[i] = across;
     upper[i] = smooth(upper[i], centre[i], across);
   }
+  return count;
 }
 
 // The vertical pass in place: `above` holds the original row above and takes this row's.
-void smooth_down_carrying(uint8_t *above, uint8_t *row, const uint8_t *below, size_t count) {
+size_t smooth_down_carrying(uint8_t *above, uint8_t *row, const uint8_t *below, size_t count) {
   for (size_t i = 0; i < count; ++i) {
     const uint8_t centre = row[i];
     row[i] = smooth(above[i], centre, below[i]);
     above[i] = centre;
   }
+  return count;
 }
 
 }  // namespace plain
 
 namespace {
 
-#if !KEL_SMALL_BUILD
-// The horizontal pass of one row, handed column by column to `column(x, smoothed)`; the first
-// and last columns are their own outer neighbours.
-template <typename Column>
-void across_row(const uint8_t *row, size_t width, Column column) {
-  column(0, smooth(row[0], row[0], row[width > 1 ? 1 : 0]));
-  for (size_t x = 1; x + 1 < width; ++x) column(x, smooth(row[x - 1], row[x], row[x + 1]));
-  if (width > 1) column(width - 1, smooth(row[width - 2], row[width - 1], row[width - 1]));
+#if defined(__GNUC__)
+#define KEL_ALWAYS_INLINE inline __attribute__((always_inline))
+#else
+#define KEL_ALWAYS_INLINE inline
+#endif
+
+// Whether `best` has a variant of its own for `entry`. The plain table has none, and there the
+// plain body does the whole row in one call; where the table is known when compiling, the test
+// goes away with the call to the variant.
+template <typename Entry>
+KEL_ALWAYS_INLINE bool has_variant(const FilterKernels &best, Entry FilterKernels::*entry) {
+  return best.*entry != kPlainFilterKernels.*entry;
 }
 
-// The same pass into `out`, which does not overlap `row`, its inner columns on `loops`.
-void smooth_row(const FilterLoops &loops, const uint8_t *row, size_t width, uint8_t *out) {
-  out[0] = smooth(row[0], row[0], row[width > 1 ? 1 : 0]);
-  if (width > 2) loops.smooth_triples(row, width - 2, out + 1);
-  if (width > 1) out[width - 1] = smooth(row[width - 2], row[width - 1], row[width - 1]);
+// The rows on the `best` table: its variant does the whole vectors from the start of the row, the
+// plain body the rest. Always inlined, so that where the table is known when compiling each
+// driver calls its plain bodies directly.
+namespace rows {
+
+KEL_ALWAYS_INLINE void smooth_triples(const FilterKernels &best, const uint8_t *src, size_t count,
+                                      uint8_t *dst) {
+  const size_t done =
+      has_variant(best, &FilterKernels::smooth_triples) ? best.smooth_triples(src, count, dst) : 0;
+  plain::smooth_triples(src + done, count - done, dst + done);
+}
+
+KEL_ALWAYS_INLINE void smooth_across_and_down(const FilterKernels &best, const uint8_t *row,
+                                              size_t count, uint8_t *upper, const uint8_t *centre,
+                                              uint8_t *lower) {
+  const size_t done = has_variant(best, &FilterKernels::smooth_across_and_down)
+                          ? best.smooth_across_and_down(row, count, upper, centre, lower)
+                          : 0;
+  plain::smooth_across_and_down(row + done, count - done, upper + done, centre + done,
+                                lower + done);
+}
+
+KEL_ALWAYS_INLINE void smooth_down_carrying(const FilterKernels &best, uint8_t *above, uint8_t *row,
+                                            const uint8_t *below, size_t count) {
+  const size_t done = has_variant(best, &FilterKernels::smooth_down_carrying)
+                          ? best.smooth_down_carrying(above, row, below, count)
+                          : 0;
+  plain::smooth_down_carrying(above + done, row + done, below + done, count - done);
+}
+
+KEL_ALWAYS_INLINE void blend_spread(const FilterKernels &best, const uint8_t *spread,
+                                    const uint8_t *odd, size_t count, uint16_t *pairs) {
+  const size_t done = has_variant(best, &FilterKernels::blend_spread)
+                          ? best.blend_spread(spread, odd, count, pairs)
+                          : 0;
+  plain::blend_spread(spread + done, odd + done, count - done, pairs + done);
+}
+
+KEL_ALWAYS_INLINE void mix_eight_rows(const FilterKernels &best, const uint16_t *upper,
+                                      const uint16_t *lower, size_t count, uint8_t *out,
+                                      size_t stride) {
+  const size_t done = has_variant(best, &FilterKernels::mix_eight_rows)
+                          ? best.mix_eight_rows(upper, lower, count, out, stride)
+                          : 0;
+  plain::mix_eight_rows(upper + done, lower + done, count - done, out + done, stride);
+}
+
+KEL_ALWAYS_INLINE void blend_rows_coarse(const FilterKernels &best, const uint16_t *top,
+                                         const uint16_t *bottom, uint32_t weight_bottom,
+                                         size_t count, uint8_t *out) {
+  const size_t done = has_variant(best, &FilterKernels::blend_rows_coarse)
+                          ? best.blend_rows_coarse(top, bottom, weight_bottom, count, out)
+                          : 0;
+  plain::blend_rows_coarse(top + done, bottom + done, weight_bottom, count - done, out + done);
+}
+
+}  // namespace rows
+
+// The horizontal pass at column x of a row; the first and last columns are their own outer
+// neighbours.
+uint8_t across_at(const uint8_t *row, size_t width, size_t x) {
+  return smooth(row[x > 0 ? x - 1 : 0], row[x], row[x + 1 < width ? x + 1 : x]);
 }
 
 // From `in` into a separate `out`, both passes in one sweep down the image, so that every row
 // is read once from memory and the rows in use stay in the cache. The horizontal pass of input
 // row k is kept in output row k + 1 until that row is written: output row k + 1 is its last
 // reader, and as each output pixel needs only the passes in its own column, the output row can
-// replace the pass it reads pixel by pixel.
-void blur_apart(const FilterLoops &loops, const uint8_t *in, size_t height, size_t width,
+// replace the pass it reads pixel by pixel. The columns between the first and the last go to the
+// table's rows, the two edge columns around them.
+void blur_apart(const FilterKernels &best, const uint8_t *in, size_t height, size_t width,
                 uint8_t *out) {
-  smooth_row(loops, in, width, out);
+  const size_t last = width - 1;
+  const size_t inner = width > 2 ? width - 2 : 0;  // the columns with both neighbours in the row
+  out[0] = across_at(in, width, 0);
+  out[last] = across_at(in, width, last);
+  rows::smooth_triples(best, in, inner, out + 1);
   if (height == 1) return;               // the row is its own upper and lower neighbour
   std::memcpy(out + width, out, width);  // row 0 is its own upper neighbour
   for (size_t y = 0; y + 2 < height; ++y) {
     uint8_t *const upper = out + y * width;
     uint8_t *const lower = upper + 2 * width;
-    const auto down = [upper, lower, width](size_t x, uint8_t h) {
-      lower[x] = h;
-      upper[x] = smooth(upper[x], upper[width + x], h);
-    };
     const uint8_t *const row = in + (y + 1) * width;
-    if (width > 2) {  // the inner columns in one call, the edges around them
-      loops.smooth_across_and_down(row, width - 2, upper + 1, upper + width + 1, lower + 1);
-      down(0, smooth(row[0], row[0], row[1]));
-      down(width - 1, smooth(row[width - 2], row[width - 1], row[width - 1]));
-    } else {
-      across_row(row, width, down);
-    }
+    rows::smooth_across_and_down(best, row, inner, upper + 1, upper + width + 1, lower + 1);
+    // The first and last columns, both found before either is stored: in a row of one pixel
+    // they are the same column.
+    const uint8_t first = across_at(row, width, 0);
+    const uint8_t final = across_at(row, width, last);
+    const uint8_t first_out = smooth(upper[0], upper[width], first);
+    const uint8_t last_out = smooth(upper[last], upper[width + last], final);
+    lower[0] = first;
+    lower[last] = final;
+    upper[0] = first_out;
+    upper[last] = last_out;
   }
   // The last input row has no output row to wait in: its pass finishes both last output rows,
   // the last one being its own lower neighbour.
   uint8_t *const upper = out + (height - 2) * width;
   uint8_t *const lower = upper + width;
-  across_row(in + (height - 1) * width, width, [upper, lower](size_t x, uint8_t h) {
+  const uint8_t *const row = in + (height - 1) * width;
+  for (size_t x = 0; x < width; ++x) {
+    const uint8_t across = across_at(row, width, x);
     const uint8_t centre = lower[x];
-    upper[x] = smooth(upper[x], centre, h);
-    lower[x] = smooth(centre, h, h);
-  });
+    upper[x] = smooth(upper[x], centre, across);
+    lower[x] = smooth(centre, across, across);
+  }
 }
-
-#endif
 
 // In place: the horizontal pass row by row, each strip copied to the stack before it is
 // overwritten, its last original byte carried on as the next strip's left neighbour; then the
 // vertical pass strip by strip down the columns, the original row above carried on the stack.
-void blur_in_place(const FilterLoops &loops, uint8_t *pixels, size_t height, size_t width) {
+void blur_in_place(const FilterKernels &best, uint8_t *pixels, size_t height, size_t width) {
   uint8_t window[kBlurStrip + 2];
   for (size_t y = 0; y < height; ++y) {
     uint8_t *row = pixels + y * width;
@@ -151,7 +222,7 @@ void blur_in_place(const FilterLoops &loops, uint8_t *pixels, size_t height, siz
       // The byte after the strip is not written yet; past the last column the edge repeats.
       window[count + 1] = start + count < width ? row[start + count] : window[count];
       left = window[count];
-      loops.smooth_triples(window, count, row + start);
+      rows::smooth_triples(best, window, count, row + start);
     }
   }
   uint8_t above[kBlurStrip];
@@ -162,7 +233,7 @@ void blur_in_place(const FilterLoops &loops, uint8_t *pixels, size_t height, siz
       uint8_t *const row = pixels + y * width + start;
       // The last row is its own lower neighbour: row[i] is read below before it is written.
       const uint8_t *const below = y + 1 < height ? row + width : row;
-      loops.smooth_down_carrying(above, row, below, count);
+      rows::smooth_down_carrying(best, above, row, below, count);
     }
   }
 }
@@ -239,14 +310,15 @@ bool weights_are_coarse(uint16_t factor) {
 
 namespace plain {
 
-void blend_rows_coarse(const uint16_t *top, const uint16_t *bottom, uint32_t weight_bottom,
-                       size_t count, uint8_t *out) {
+size_t blend_rows_coarse(const uint16_t *top, const uint16_t *bottom, uint32_t weight_bottom,
+                         size_t count, uint8_t *out) {
   const auto bottom_part = static_cast<uint16_t>(weight_bottom >> kCoarseShift);
   const auto top_part = static_cast<uint16_t>(16 - bottom_part);
   for (size_t i = 0; i < count; ++i) {
     const auto total = static_cast<uint16_t>(top[i] * top_part + bottom[i] * bottom_part + 128);
     out[i] = static_cast<uint8_t>(total >> 8);
   }
+  return count;
 }
 
 }  // namespace plain
@@ -256,7 +328,7 @@ namespace {
 // Any factor, strip by strip: the sample positions of a strip's columns are found once, and
 // each input row is blended along them once for all the output rows between it and its
 // neighbours.
-void scale_up_any(const FilterLoops &loops, const uint8_t *in, uint16_t in_height,
+void scale_up_any(const FilterKernels &best, const uint8_t *in, uint16_t in_height,
                   uint16_t in_width, uint16_t factor, uint8_t *out, uint16_t out_height,
                   uint16_t out_width) {
   const bool coarse = weights_are_coarse(factor);
@@ -270,12 +342,12 @@ void scale_up_any(const FilterLoops &loops, const uint8_t *in, uint16_t in_heigh
     }
     uint16_t *top = blended[0];
     uint16_t *bottom = blended[1];
-    Tap rows_held{0, 0, 0};
-    bool held = false;
+    // Input rows lie below 65535, so at the start no row is held.
+    Tap rows_held{UINT16_MAX, UINT16_MAX, 0};
     for (size_t y = 0; y < out_height; ++y) {
       const Tap row = locate(static_cast<uint32_t>(y), factor, in_height);
-      if (!held || row.first != rows_held.first || row.second != rows_held.second) {
-        if (held && row.first == rows_held.second) {
+      if (row.first != rows_held.first || row.second != rows_held.second) {
+        if (row.first == rows_held.second) {
           uint16_t *const reused = bottom;  // moving down one input row: the bottom becomes top
           bottom = top;
           top = reused;
@@ -284,11 +356,10 @@ void scale_up_any(const FilterLoops &loops, const uint8_t *in, uint16_t in_heigh
         }
         blend_row_of_columns(in + size_t{row.second} * in_width, columns, count, shift, bottom);
         rows_held = row;
-        held = true;
       }
       uint8_t *out_row = out + y * out_width + start;
       if (coarse) {
-        loops.blend_rows_coarse(top, bottom, row.weight_second, count, out_row);
+        rows::blend_rows_coarse(best, top, bottom, row.weight_second, count, out_row);
       } else {
         blend_rows(top, bottom, row.weight_second, count, out_row);
       }
@@ -315,32 +386,26 @@ constexpr size_t kScale8Strip = kSmallBuild ? 64 : 256;
 // k = first_run - 1 .. first_run + runs - 1, so output column 8 * first_run + i is pairs[i + 4].
 // Each sample is first spread over 8 bytes, so that the blend reads its two samples at fixed
 // distances with weights that repeat every 8 columns.
-void blend_row_by_8(const FilterLoops &loops, const uint8_t *row, size_t width, size_t first_run,
+void blend_row_by_8(const FilterKernels &best, const uint8_t *row, size_t width, size_t first_run,
                     size_t runs, const uint8_t *odd, uint16_t *pairs) {
   uint8_t spread[kScale8Strip + 16];  // samples first_run - 1 .. first_run + runs, 8 times each
-  const size_t count = runs + 2;
-  // Spread run i holds sample first_run - 1 + i: row[0] before the row (runs below `inside`),
-  // row[width - 1] after it (runs from `past` on).
-  const size_t inside = first_run == 0 ? 1 : 0;
-  const size_t after_row = width + 1 > first_run ? width + 1 - first_run : 0;
-  const size_t past = after_row < count ? after_row : count;
-  for (size_t i = 0; i < inside; ++i) std::memset(spread + 8 * i, row[0], 8);
-  for (size_t i = inside; i < past; ++i) {
-    const uint8_t sample = row[first_run + i - 1];
-    for (size_t j = 0; j < 8; ++j) spread[8 * i + j] = sample;
+  for (size_t i = 0; i < runs + 2; ++i) {
+    // Spread run i holds sample first_run - 1 + i, clamped to the row: k is one past it.
+    const size_t k = first_run + i;
+    std::memset(spread + 8 * i, row[k == 0 ? 0 : (k < width ? k : width) - 1], 8);
   }
-  for (size_t i = past; i < count; ++i) std::memset(spread + 8 * i, row[width - 1], 8);
-  loops.blend_spread(spread, odd, 8 * (runs + 1), pairs);
+  rows::blend_spread(best, spread, odd, 8 * (runs + 1), pairs);
 }
 
 }  // namespace
 
 namespace plain {
 
-void blend_spread(const uint8_t *spread, const uint8_t *odd, size_t count, uint16_t *pairs) {
+size_t blend_spread(const uint8_t *spread, const uint8_t *odd, size_t count, uint16_t *pairs) {
   for (size_t x = 0; x < count; ++x) {
     pairs[x] = static_cast<uint16_t>(16 * spread[x] + odd[x] * (spread[x + 8] - spread[x]));
   }
+  return count;
 }
 
 // The rows a loop writes lie apart, which the compiler cannot know; GCC otherwise compares every
@@ -354,8 +419,8 @@ void blend_spread(const uint8_t *spread, const uint8_t *odd, size_t count, uint1
 // The eight output rows between two input rows (1, 3, .., 15 sixteenths of the lower one). The
 // total is 16 * upper + 128 + (2j + 1) * (lower - upper); taken modulo 2^16 it stays exact,
 // since the true total fits 16 bits.
-void mix_eight_rows(const uint16_t *upper, const uint16_t *lower, size_t count, uint8_t *out,
-                    size_t stride) {
+size_t mix_eight_rows(const uint16_t *upper, const uint16_t *lower, size_t count, uint8_t *out,
+                      size_t stride) {
   KEL_ROWS_LIE_APART
   for (size_t i = 0; i < count; ++i) {
     const int difference = lower[i] - upper[i];
@@ -366,13 +431,14 @@ void mix_eight_rows(const uint16_t *upper, const uint16_t *lower, size_t count, 
       total = static_cast<uint16_t>(total + step);
     }
   }
+  return count;
 }
 
 }  // namespace plain
 
 namespace {
 
-void scale_up_by_8(const FilterLoops &loops, const uint8_t *in, size_t in_height, size_t in_width,
+void scale_up_by_8(const FilterKernels &best, const uint8_t *in, size_t in_height, size_t in_width,
                    uint8_t *out, size_t out_height, size_t out_width) {
   uint16_t pairs[2][kScale8Strip + 8];
   uint8_t odd[kScale8Strip + 8];  // 2j + 1 for column 8q + j
@@ -380,59 +446,49 @@ void scale_up_by_8(const FilterLoops &loops, const uint8_t *in, size_t in_height
   for (size_t start = 0; start < out_width; start += kScale8Strip) {
     const size_t count = strip_length(start, out_width, kScale8Strip);
     const size_t runs = (count + 7) / 8;
-    const auto blend = [&](size_t in_row, uint16_t *into) {
-      blend_row_by_8(loops, in + in_row * in_width, in_width, start / 8, runs, odd, into - 4);
-    };
     // Output rows 8u + 4 .. 8u + 11 lie between input rows u and u + 1, both clamped: band
     // u + 1 of the loop below. Rows 0 .. 3 lie between row 0 and itself (u = -1, band 0).
     const size_t last_in = in_height - 1;
     uint16_t *const blended[2] = {pairs[0] + 4, pairs[1] + 4};  // from output column `start`
     uint16_t *lower = blended[0];
-    blend(0, lower);
+    blend_row_by_8(best, in, in_width, start / 8, runs, odd, lower - 4);
     size_t lower_row = 0;
     for (size_t band = 0; 8 * band < out_height + 4; ++band) {
       const uint16_t *const upper = lower;  // the previous band's lower row
       const size_t next_row = band < last_in ? band : last_in;
       if (next_row != lower_row) {  // past the last input row both are the last one
         lower = lower == blended[0] ? blended[1] : blended[0];
-        blend(next_row, lower);
+        blend_row_by_8(best, in + next_row * in_width, in_width, start / 8, runs, odd, lower - 4);
         lower_row = next_row;
       }
       const size_t first = band == 0 ? 0 : 8 * band - 4;  // first output row of the band
       const size_t end = 8 * band + 4 < out_height ? 8 * band + 4 : out_height;
-      uint8_t *rows = out + first * out_width + start;
+      uint8_t *band_rows = out + first * out_width + start;
       if (end - first == 8) {
-        loops.mix_eight_rows(upper, lower, count, rows, out_width);
+        rows::mix_eight_rows(best, upper, lower, count, band_rows, out_width);
       } else {
-        for (size_t y = first; y < end; ++y, rows += out_width) {
+        for (size_t y = first; y < end; ++y, band_rows += out_width) {
           const size_t lower_part = 2 * (y + 4 - 8 * band) + 1;  // in sixteenths
-          loops.blend_rows_coarse(upper, lower, static_cast<uint32_t>(lower_part << kCoarseShift),
-                                  count, rows);
+          rows::blend_rows_coarse(best, upper, lower,
+                                  static_cast<uint32_t>(lower_part << kCoarseShift), count,
+                                  band_rows);
         }
       }
     }
   }
 }
 
-}  // namespace
-
-void blur(const FilterLoops &loops, const uint8_t *in, uint16_t height, uint16_t width,
+void blur(const FilterKernels &best, const uint8_t *in, uint16_t height, uint16_t width,
           uint8_t *out) {
   if (height == 0 || width == 0) return;
-#if KEL_SMALL_BUILD
-  // The in-place blur of a copy gives the same bytes without the code of the one-sweep blur.
-  if (in != out) std::memcpy(out, in, size_t{height} * width);
-  blur_in_place(loops, out, height, width);
-#else
   if (in == out) {
-    blur_in_place(loops, out, height, width);
+    blur_in_place(best, out, height, width);
   } else {
-    blur_apart(loops, in, height, width, out);
+    blur_apart(best, in, height, width, out);
   }
-#endif
 }
 
-void scale_up_bilinear(const FilterLoops &loops, const uint8_t *in, uint16_t in_height,
+void scale_up_bilinear(const FilterKernels &best, const uint8_t *in, uint16_t in_height,
                        uint16_t in_width, uint16_t factor, uint8_t *out, uint16_t out_height,
                        uint16_t out_width) {
   const size_t out_pixels = size_t{out_height} * out_width;
@@ -442,26 +498,27 @@ void scale_up_bilinear(const FilterLoops &loops, const uint8_t *in, uint16_t in_
     return;
   }
   if (factor == 8) {
-    scale_up_by_8(loops, in, in_height, in_width, out, out_height, out_width);
+    scale_up_by_8(best, in, in_height, in_width, out, out_height, out_width);
   } else {
-    scale_up_any(loops, in, in_height, in_width, factor, out, out_height, out_width);
+    scale_up_any(best, in, in_height, in_width, factor, out, out_height, out_width);
   }
 }
 
+}  // namespace
 }  // namespace outside
 }  // namespace kel
 
 extern "C" {
 
 void kel_blur_uint8(const uint8_t *in, uint16_t height, uint16_t width, uint8_t *out) {
-  kel::outside::blur(kel::outside::simd::filter_loops(), in, height, width, out);
+  kel::outside::blur(kel::outside::filter_kernels(), in, height, width, out);
 }
 
 void kel_scale_up_bilinear_uint8(const uint8_t *in, uint16_t in_height, uint16_t in_width,
                                  uint16_t factor, uint8_t *out, uint16_t out_height,
                                  uint16_t out_width) {
-  kel::outside::scale_up_bilinear(kel::outside::simd::filter_loops(), in, in_height, in_width,
-                                  factor, out, out_height, out_width);
+  kel::outside::scale_up_bilinear(kel::outside::filter_kernels(), in, in_height, in_width, factor,
+                                  out, out_height, out_width);
 }
 
 }  // extern "C"

@@ -1,6 +1,6 @@
-// Vector variants of the blur's and the enlargement's row loops, compiled once per instruction
-// set and picked at run time. The plain loops in image_filters.cpp are the reference they are
-// tested against, and finish the last pixels of each row that do not fill a vector.
+// The kernel table of our blur and enlargement for every instruction set Highway builds for, and
+// the run-time choice among them. Each variant does the whole vectors of its row and returns how
+// many pixels they covered; the plain bodies in image_filters.cpp, the reference, finish the row.
 #undef HWY_TARGET_INCLUDE
 #define HWY_TARGET_INCLUDE "image_filters_simd.cpp"
 #include "image_filters_simd.h"
@@ -17,13 +17,12 @@ namespace simd {
 namespace HWY_NAMESPACE {
 namespace hn = hwy::HWY_NAMESPACE;
 
-// The one-lane fallback target has no 16-bit view of a byte vector; it takes the plain loops.
-#define KEL_FILTER_VECTORS (HWY_TARGET != HWY_SCALAR)
+// The one-lane fallback target has no 16-bit view of a byte vector; its table is the plain one.
+#if HWY_TARGET != HWY_SCALAR
 
-#if KEL_FILTER_VECTORS
-
-// Runs step(d, i) on whole byte vectors of the row, full ones and then 16-byte ones for the
-// rest, and returns how many pixels they covered; the plain loop finishes the last few.
+// Runs step(d, i) on whole byte vectors of the row, full ones and then 16- and 8-byte ones for
+// the rest, and returns how many pixels they covered. The plain body, one pixel at a time, is
+// left fewer than 8.
 template <class Step>
 size_t for_each_vector(size_t count, Step step) {
   size_t i = 0;
@@ -31,6 +30,11 @@ size_t for_each_vector(size_t count, Step step) {
   for (; count - i >= hn::Lanes(d); i += hn::Lanes(d)) step(d, i);
   const hn::CappedTag<uint8_t, 16> d16;
   for (; count - i >= hn::Lanes(d16); i += hn::Lanes(d16)) step(d16, i);
+  const hn::CappedTag<uint8_t, 8> d8;
+  if (count - i >= hn::Lanes(d8)) {
+    step(d8, i);
+    i += hn::Lanes(d8);
+  }
   return i;
 }
 
@@ -44,19 +48,23 @@ hn::Vec<D> smooth(D d, hn::Vec<D> before, hn::Vec<D> centre, hn::Vec<D> after) {
 }
 
 // The high bytes of the 16-bit lanes of `lower` and then `upper`, in order: the totals >> 8 of
-// the enlargement. Highway's targets are little-endian, so a lane's high byte is its odd one.
+// the enlargement. A lane's high byte is its second in memory on little-endian CPUs and its
+// first on big-endian ones, such as s390x with Highway's four-lane portable target.
 template <class D8, class V16>
 hn::Vec<D8> high_bytes(D8 d8, V16 lower, V16 upper) {
+#if defined(__BYTE_ORDER__) && __BYTE_ORDER__ == __ORDER_BIG_ENDIAN__
+  return hn::ConcatEven(d8, hn::BitCast(d8, upper), hn::BitCast(d8, lower));
+#else
   return hn::ConcatOdd(d8, hn::BitCast(d8, upper), hn::BitCast(d8, lower));
+#endif
 }
 
-void SmoothTriples(const uint8_t *src, size_t count, uint8_t *dst) {
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
+size_t SmoothTriples(const uint8_t *src, size_t count, uint8_t *dst) {
+  return for_each_vector(count, [&](auto d, size_t i) {
     hn::StoreU(
         smooth(d, hn::LoadU(d, src + i), hn::LoadU(d, src + i + 1), hn::LoadU(d, src + i + 2)), d,
         dst + i);
   });
-  plain::smooth_triples(src + done, count - done, dst + done);
 }
 
 // Both passes of the pixels i .. i + lanes - 1, each load before the stores: with rows of 2048
@@ -80,8 +88,8 @@ struct AcrossAndDown {
 // the row length is a multiple of the vector). The pixels before the first such address are
 // covered by one vector from the start, computed, like the first aligned one it overlaps, from
 // the original `upper` before either is stored: both store the same values where they meet.
-void SmoothAcrossAndDown(const uint8_t *row, size_t count, uint8_t *upper, const uint8_t *centre,
-                         uint8_t *lower) {
+size_t SmoothAcrossAndDown(const uint8_t *row, size_t count, uint8_t *upper, const uint8_t *centre,
+                           uint8_t *lower) {
   const hn::ScalableTag<uint8_t> d;
   const size_t lanes = hn::Lanes(d);
   const size_t head = (lanes - reinterpret_cast<uintptr_t>(upper) % lanes) % lanes;
@@ -93,27 +101,24 @@ void SmoothAcrossAndDown(const uint8_t *row, size_t count, uint8_t *upper, const
     aligned.store(d, upper, lower, head);
     start = head + lanes;
   }
-  const size_t done = start + for_each_vector(count - start, [&](auto dv, size_t i) {
-                        AcrossAndDown<decltype(dv)>(dv, row, upper, centre, start + i)
-                            .store(dv, upper, lower, start + i);
-                      });
-  plain::smooth_across_and_down(row + done, count - done, upper + done, centre + done,
-                                lower + done);
+  return start + for_each_vector(count - start, [&](auto dv, size_t i) {
+           AcrossAndDown<decltype(dv)>(dv, row, upper, centre, start + i)
+               .store(dv, upper, lower, start + i);
+         });
 }
 
 // Each vector of `below` is read before the same pixels of `row` are written, so `below` may
 // be `row` itself.
-void SmoothDownCarrying(uint8_t *above, uint8_t *row, const uint8_t *below, size_t count) {
-  const size_t done = for_each_vector(count, [&](auto d, size_t i) {
+size_t SmoothDownCarrying(uint8_t *above, uint8_t *row, const uint8_t *below, size_t count) {
+  return for_each_vector(count, [&](auto d, size_t i) {
     const auto centre = hn::LoadU(d, row + i);
     hn::StoreU(smooth(d, hn::LoadU(d, above + i), centre, hn::LoadU(d, below + i)), d, row + i);
     hn::StoreU(centre, d, above + i);
   });
-  plain::smooth_down_carrying(above + done, row + done, below + done, count - done);
 }
 
 // In 16-bit lanes, each widened from bytes; the sum is taken modulo 2^16 as in the plain loop.
-void BlendSpread(const uint8_t *spread, const uint8_t *odd, size_t count, uint16_t *pairs) {
+size_t BlendSpread(const uint8_t *spread, const uint8_t *odd, size_t count, uint16_t *pairs) {
   const hn::ScalableTag<uint16_t> d16;
   const hn::Rebind<uint8_t, decltype(d16)> d8;
   const size_t lanes = hn::Lanes(d16);
@@ -125,13 +130,13 @@ void BlendSpread(const uint8_t *spread, const uint8_t *odd, size_t count, uint16
     hn::StoreU(hn::Add(hn::ShiftLeft<4>(sample), hn::Mul(weight, hn::Sub(next, sample))), d16,
                pairs + i);
   }
-  plain::blend_spread(spread + i, odd + i, count - i, pairs + i);
+  return i;
 }
 
 // A byte vector's worth of columns at a time, as two vectors of 16-bit totals.
-void MixEightRows(const uint16_t *upper, const uint16_t *lower, size_t count, uint8_t *out,
-                  size_t stride) {
-  const size_t done = for_each_vector(count, [&](auto d8, size_t i) {
+size_t MixEightRows(const uint16_t *upper, const uint16_t *lower, size_t count, uint8_t *out,
+                    size_t stride) {
+  return for_each_vector(count, [&](auto d8, size_t i) {
     const hn::Repartition<uint16_t, decltype(d8)> d16;
     const size_t half = hn::Lanes(d16);
     const auto upper_low = hn::LoadU(d16, upper + i);
@@ -149,15 +154,14 @@ void MixEightRows(const uint16_t *upper, const uint16_t *lower, size_t count, ui
       total_high = hn::Add(total_high, step_high);
     }
   });
-  plain::mix_eight_rows(upper + done, lower + done, count - done, out + done, stride);
 }
 
 // The total is at most 4080 * 16 + 128, so it fits a 16-bit lane.
-void BlendRowsCoarse(const uint16_t *top, const uint16_t *bottom, uint32_t weight_bottom,
-                     size_t count, uint8_t *out) {
+size_t BlendRowsCoarse(const uint16_t *top, const uint16_t *bottom, uint32_t weight_bottom,
+                       size_t count, uint8_t *out) {
   const auto bottom_part = static_cast<uint16_t>(weight_bottom >> 4);
   const auto top_part = static_cast<uint16_t>(16 - bottom_part);
-  const size_t done = for_each_vector(count, [&](auto d8, size_t i) {
+  return for_each_vector(count, [&](auto d8, size_t i) {
     const hn::Repartition<uint16_t, decltype(d8)> d16;
     const size_t half = hn::Lanes(d16);
     const auto top_weight = hn::Set(d16, top_part);
@@ -172,33 +176,17 @@ void BlendRowsCoarse(const uint16_t *top, const uint16_t *bottom, uint32_t weigh
                 rounding);
     hn::StoreU(high_bytes(d8, total_low, total_high), d8, out + i);
   });
-  plain::blend_rows_coarse(top + done, bottom + done, weight_bottom, count - done, out + done);
 }
 
+constexpr FilterKernels kTable = {SmoothTriples, SmoothAcrossAndDown, SmoothDownCarrying,
+                                  BlendSpread,   MixEightRows,        BlendRowsCoarse};
 #else
-// The fallback target's variants are the plain loops.
-void SmoothTriples(const uint8_t *src, size_t count, uint8_t *dst) {
-  plain::smooth_triples(src, count, dst);
+constexpr FilterKernels kTable = kPlainFilterKernels;
+#endif
+
+const FilterKernels *TargetFilterKernels() {
+  return &kTable;
 }
-void SmoothAcrossAndDown(const uint8_t *row, size_t count, uint8_t *upper, const uint8_t *centre,
-                         uint8_t *lower) {
-  plain::smooth_across_and_down(row, count, upper, centre, lower);
-}
-void SmoothDownCarrying(uint8_t *above, uint8_t *row, const uint8_t *below, size_t count) {
-  plain::smooth_down_carrying(above, row, below, count);
-}
-void BlendSpread(const uint8_t *spread, const uint8_t *odd, size_t count, uint16_t *pairs) {
-  plain::blend_spread(spread, odd, count, pairs);
-}
-void MixEightRows(const uint16_t *upper, const uint16_t *lower, size_t count, uint8_t *out,
-                  size_t stride) {
-  plain::mix_eight_rows(upper, lower, count, out, stride);
-}
-void BlendRowsCoarse(const uint16_t *top, const uint16_t *bottom, uint32_t weight_bottom,
-                     size_t count, uint8_t *out) {
-  plain::blend_rows_coarse(top, bottom, weight_bottom, count, out);
-}
-#endif  // KEL_FILTER_VECTORS
 
 }  // namespace HWY_NAMESPACE
 }  // namespace simd
@@ -211,25 +199,20 @@ namespace kel {
 namespace outside {
 namespace simd {
 
-HWY_EXPORT(SmoothTriples);
-HWY_EXPORT(SmoothAcrossAndDown);
-HWY_EXPORT(SmoothDownCarrying);
-HWY_EXPORT(BlendSpread);
-HWY_EXPORT(MixEightRows);
-HWY_EXPORT(BlendRowsCoarse);
+HWY_EXPORT(TargetFilterKernels);
 
-// A blur or an enlargement runs hundreds of short rows; it takes the loops once instead of
-// asking the dispatch for each row. Until the first dispatched call has chosen a target the
-// table holds the choosing stubs, so one empty call goes first.
-FilterLoops filter_loops() {
-  uint8_t nothing = 0;
-  HWY_DYNAMIC_DISPATCH(SmoothTriples)(&nothing, 0, &nothing);
-  return {&HWY_DYNAMIC_DISPATCH(SmoothTriples),      &HWY_DYNAMIC_DISPATCH(SmoothAcrossAndDown),
-          &HWY_DYNAMIC_DISPATCH(SmoothDownCarrying), &HWY_DYNAMIC_DISPATCH(BlendSpread),
-          &HWY_DYNAMIC_DISPATCH(MixEightRows),       &HWY_DYNAMIC_DISPATCH(BlendRowsCoarse)};
+// Dispatched from the getter's own namespace: where Highway is built in with its headers alone,
+// the dispatch is static and names the getter, as written here, inside the target's namespace.
+const FilterKernels *ChosenFilterKernels() {
+  return HWY_DYNAMIC_DISPATCH(TargetFilterKernels)();
 }
 
 }  // namespace simd
+
+const FilterKernels &filter_kernels() {
+  return *simd::ChosenFilterKernels();
+}
+
 }  // namespace outside
 }  // namespace kel
 #endif  // HWY_ONCE
