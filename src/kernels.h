@@ -139,6 +139,7 @@ const Kernels &kernels();
 
 #if KEL_ARM_DSP
 namespace dsp {
+size_t copy(const uint8_t *in, size_t count, uint8_t *out);
 size_t brighten(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
 size_t darken(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
 size_t mask(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
@@ -189,7 +190,7 @@ inline constexpr Kernels kCompiledKernels = {"DSP",
                                              dsp::brighten,
                                              dsp::darken,
                                              dsp::mask,
-                                             plain::copy,
+                                             dsp::copy,
                                              dsp::blend,
                                              dsp::paste_keyed,
                                              dsp::blend_keyed,

@@ -7,7 +7,7 @@ set -euo pipefail
 cd "$(dirname "$0")/../.."
 preset=${1:-cortex-m4}
 cmake --preset "$preset" >/dev/null
-cmake --build --preset "$preset" >/dev/null
+cmake --build --preset "$preset" >/dev/null || cmake --build --preset "$preset"  # errors shown
 tests/mcu/firmware.sh build "build/$preset" "build/$preset/kernel_sweep/kernel_sweep.elf" -Os \
   -Iinclude -Isrc -Isrc/outside tests/kernel_sweep.cpp
 tests/mcu/firmware.sh run "build/$preset" "build/$preset/kernel_sweep/kernel_sweep.elf"
