@@ -118,18 +118,29 @@ def main():
                     targets.add(node_of(obj, target))
                     called.add(node_of(obj, target))
 
+    # Calls through a pointer, to every function whose address the caller's object takes: more
+    # than the code can reach, so a cycle through one of them is no recursion of the code's, and
+    # such a cycle is cut where it closes (a rotation's run function, whose address its object
+    # takes, calls its kernel through the table).
+    indirect = {}
     for obj, caller in indirect_callers:
-        edges[caller] |= {t for t in pointer_targets.get(obj, ()) if t in frames}
+        indirect.setdefault(caller, set()).update(
+            t for t in pointer_targets.get(obj, ()) if t in frames)
     depth, on_path = {}, set()
 
     def stack(node):
         if node in depth:
             return depth[node]
-        if node in on_path:
-            failures.append(f"{node}: recursion")
-            return 0
         on_path.add(node)
-        below = max((stack(c) for c in edges.get(node, ())), default=0)
+        below = 0
+        for c in edges.get(node, ()):
+            if c in on_path:
+                failures.append(f"{node}: recursion")
+            else:
+                below = max(below, stack(c))
+        for c in indirect.get(node, ()):
+            if c not in on_path:
+                below = max(below, stack(c))
         on_path.discard(node)
         depth[node] = frames.get(node, 0) + below
         return depth[node]
@@ -137,7 +148,7 @@ def main():
     def reach(node, seen):
         if node not in seen:
             seen.add(node)
-            for c in edges.get(node, ()):
+            for c in edges.get(node, set()) | indirect.get(node, set()):
                 reach(c, seen)
 
     print(f"\n{'function':34} {'text':>6} {'with callees':>13} {'stack':>6}")

@@ -122,9 +122,88 @@ inline constexpr Kernels kPlainKernels = {"plain",
 // The table this machine runs: Highway's choice among the instruction sets it was built for.
 const Kernels &kernels();
 #else
+
+// Compile-time variants for the Arm cores Highway does not build for, in src/arm/: the DSP
+// extension's SIMD32 (Cortex-M4, M7, M33, M55) and Helium (MVE: Cortex-M55, M85). A Helium table
+// takes the DSP entries where it has none of its own.
+#if defined(__ARM_FEATURE_DSP) && defined(__arm__)
+#define KEL_ARM_DSP 1
+#else
+#define KEL_ARM_DSP 0
+#endif
+#if defined(__ARM_FEATURE_MVE) && defined(__arm__)
+#define KEL_ARM_MVE 1
+#else
+#define KEL_ARM_MVE 0
+#endif
+
+#if KEL_ARM_DSP
+namespace dsp {
+size_t copy(const uint8_t *in, size_t count, uint8_t *out);
+size_t brighten(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
+size_t darken(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
+size_t mask(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t blend(const uint8_t *in, size_t count, uint8_t *out);
+size_t paste_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t blend_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t sum_pixels(const uint8_t *pixels, size_t count, PixelSums *sums);
+}  // namespace dsp
+#endif
+
+#if KEL_ARM_MVE
+namespace mve {
+size_t brighten(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
+size_t darken(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out);
+size_t mask(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t copy(const uint8_t *in, size_t count, uint8_t *out);
+size_t blend(const uint8_t *in, size_t count, uint8_t *out);
+size_t paste_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t blend_keyed(const uint8_t *in, size_t count, uint8_t key, uint8_t *out);
+size_t count_bins(const uint8_t *pixels, size_t count, uint32_t bits, uint32_t *hist);
+size_t sum_pixels(const uint8_t *pixels, size_t count, PixelSums *sums);
+size_t rotate_u8(const RotationRun &run, uint8_t *out);
+size_t rotate_i8(const RotationRun &run, int8_t *out);
+size_t rotate_i8_nn(const RotationRun &run, int8_t *out);
+}  // namespace mve
+#endif
+
 // The table this build runs, known when compiling: each routine then calls its own kernels
 // directly, and a firmware that calls one routine carries only that routine's kernels.
+#if KEL_ARM_MVE
+inline constexpr Kernels kCompiledKernels = {"MVE",
+                                             mve::brighten,
+                                             mve::darken,
+                                             mve::mask,
+                                             mve::copy,
+                                             mve::blend,
+                                             mve::paste_keyed,
+                                             mve::blend_keyed,
+                                             plain::prefetch_for_writing,
+                                             mve::count_bins,
+                                             mve::sum_pixels,
+                                             mve::rotate_u8,
+                                             mve::rotate_i8,
+                                             mve::rotate_i8_nn,
+                                             plain::nonzero_tail};
+#elif KEL_ARM_DSP
+inline constexpr Kernels kCompiledKernels = {"DSP",
+                                             dsp::brighten,
+                                             dsp::darken,
+                                             dsp::mask,
+                                             dsp::copy,
+                                             dsp::blend,
+                                             dsp::paste_keyed,
+                                             dsp::blend_keyed,
+                                             plain::prefetch_for_writing,
+                                             plain::count_bins,
+                                             dsp::sum_pixels,
+                                             plain::rotate_u8,
+                                             plain::rotate_i8,
+                                             plain::rotate_i8_nn,
+                                             plain::nonzero_tail};
+#else
 inline constexpr Kernels kCompiledKernels = kPlainKernels;
+#endif
 constexpr const Kernels &kernels() {
   return kCompiledKernels;
 }

@@ -42,8 +42,10 @@ struct Tally {
             const uint8_t *expected, const uint8_t *got, size_t n, size_t origin) {
     for (size_t i = 0; i < n; ++i) {
       if (expected[i] != got[i]) {
-        printf("FAIL %s %s, %s, length %zu, input %zu bytes off: byte %lld expected %u got %u\n",
-               table, kernel, what, length, shift,
+        // Sizes printed as unsigned long: newlib for microcontrollers may not know %zu.
+        printf("FAIL %s %s, %s, length %lu, input %lu bytes off: byte %lld expected %u got %u\n",
+               table, kernel, what, static_cast<unsigned long>(length),
+               static_cast<unsigned long>(shift),
                static_cast<long long>(i) - static_cast<long long>(origin), expected[i], got[i]);
         ++failed;
         return;
@@ -134,8 +136,8 @@ void sweep_rows(const kel::Kernels &k, Tally &tally) {
           const size_t done = row.run(k, in + kGuard + shift, length, got + kGuard, param);
           snprintf(what, sizeof what, "%s, setting %d", kPatternNames[p], param);
           if (done > length) {
-            printf("FAIL %s %s, %s, length %zu: did %zu pixels\n", k.name, row.name, what, length,
-                   done);
+            printf("FAIL %s %s, %s, length %lu: did %lu pixels\n", k.name, row.name, what,
+                   static_cast<unsigned long>(length), static_cast<unsigned long>(done));
             ++tally.failed;
             continue;
           }
@@ -176,7 +178,7 @@ void sweep_statistics(const kel::Kernels &k, Tally &tally) {
         kel::kPlainKernels.count_bins(at + done, length - done, bits, got);
         kel::kPlainKernels.count_bins(at, length, bits, expected);
         char what[32];
-        snprintf(what, sizeof what, "%u bits", bits);
+        snprintf(what, sizeof what, "%u bits", static_cast<unsigned>(bits));
         tally.same(k.name, "count_bins", what, length, shift,
                    reinterpret_cast<const uint8_t *>(expected),
                    reinterpret_cast<const uint8_t *>(got), sizeof expected, 0);
@@ -212,6 +214,23 @@ void sweep_tails(const kel::Kernels &k, Tally &tally) {
 }
 
 // Runs through sources of a few shapes along the turns of several angles, every position inside.
+// One run on table k's entry, the plain body finishing it, against the plain body alone.
+template <typename Pixel>
+void check_run(const kel::Kernels &k, kel::RotationRow<Pixel> kel::Kernels::*entry,
+               const char *name, const kel::RotationRun &run, const char *what, Tally &tally) {
+  Pixel expected[kLongest + kGuard], got[kLongest + kGuard];
+  memset(expected, kGuardByte, sizeof expected), memset(got, kGuardByte, sizeof got);
+  (kel::kPlainKernels.*entry)(run, expected);
+  const size_t done = (k.*entry)(run, got);
+  kel::RotationRun rest = run;
+  rest.x += int64_t{run.step_x} * static_cast<int64_t>(done);
+  rest.y += int64_t{run.step_y} * static_cast<int64_t>(done);
+  rest.count -= done;
+  if (done <= run.count) (kel::kPlainKernels.*entry)(rest, got + done);
+  tally.same(k.name, name, what, run.count, 0, reinterpret_cast<const uint8_t *>(expected),
+             reinterpret_cast<const uint8_t *>(got), sizeof expected, 0);
+}
+
 template <typename Pixel>
 void sweep_rotation(const kel::Kernels &k, kel::RotationRow<Pixel> kel::Kernels::*entry,
                     const char *name, int64_t reach, Tally &tally) {
@@ -241,20 +260,31 @@ void sweep_rotation(const kel::Kernels &k, kel::RotationRow<Pixel> kel::Kernels:
              x += cos, y += sin) {
           ++run.count;
         }
-        Pixel expected[kLongest + kGuard], got[kLongest + kGuard];
-        memset(expected, kGuardByte, sizeof expected), memset(got, kGuardByte, sizeof got);
-        (kel::kPlainKernels.*entry)(run, expected);
-        const size_t done = (k.*entry)(run, got);
-        kel::RotationRun rest = run;
-        rest.x += int64_t{cos} * static_cast<int64_t>(done);
-        rest.y += int64_t{sin} * static_cast<int64_t>(done);
-        rest.count -= done;
-        if (done <= run.count) (kel::kPlainKernels.*entry)(rest, got + done);
         char what[64];
         snprintf(what, sizeof what, "%lldx%lld angle %d start %d", static_cast<long long>(height),
                  static_cast<long long>(width), angle, start);
-        tally.same(k.name, name, what, run.count, 0, reinterpret_cast<const uint8_t *>(expected),
-                   reinterpret_cast<const uint8_t *>(got), sizeof expected, 0);
+        check_run(k, entry, name, run, what, tally);
+      }
+    }
+  }
+  // Totals just above a whole multiple of 2^28: a source of v with v + 1 at its odd columns of
+  // odd rows, read at fractions fx, fy past even whole points, gives v * 2^28 + fx * fy, which a
+  // signed run truncates toward zero to v + 1 when v is negative, however small fx * fy is.
+  constexpr int64_t kHeight = 4, kWidth = 40;
+  static const int kValues[] = {-128, -3, -1, 0, 2, 126};
+  static const int32_t kFractions[] = {0, 1, 5, 127, 16383};
+  for (const int v : kValues) {
+    for (int64_t y = 0; y < kHeight; ++y) {
+      for (int64_t x = 0; x < kWidth; ++x)
+        source[y * kWidth + x] = static_cast<uint8_t>(v + ((x & y & 1) != 0 ? 1 : 0));
+    }
+    for (const int32_t fx : kFractions) {
+      for (const int32_t fy : kFractions) {
+        const kel::RotationRun run{source, kHeight, kWidth, fx, 2 * 16384 + fy, 2 * 16384, 0, 19};
+        char what[64];
+        snprintf(what, sizeof what, "near whole %d, fractions %ld %ld", v, static_cast<long>(fx),
+                 static_cast<long>(fy));
+        check_run(k, entry, name, run, what, tally);
       }
     }
   }

@@ -171,6 +171,7 @@ def main():
         with open(README, "w") as f:
             f.write(text[:begin] + "\n" + readme_table(counts) + "\n" + text[end:])
         print(readme_table(counts))
+        return 0
 
     budgets = read_budgets()
     print(f"{'instructions per unit':44}" + "".join(f"{p:>12} {'budget':>7}" for p in PRESETS))

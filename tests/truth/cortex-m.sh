@@ -7,7 +7,7 @@ set -euo pipefail
 cd "$(dirname "$0")/../.."
 preset=${1:-cortex-m4}
 cmake --preset "$preset" >/dev/null
-cmake --build --preset "$preset" >/dev/null
+cmake --build --preset "$preset" >/dev/null || cmake --build --preset "$preset"  # errors shown
 out=build/$preset/truth
 mkdir -p "$out"
 cmake -DIN=tests/truth/truth.txt -DOUT="$out/truth_table.inc" -P tests/truth/embed.cmake
