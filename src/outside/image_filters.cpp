@@ -14,7 +14,8 @@
 #include "image_filters_simd.h"
 #include "kel_outside.h"
 
-// A build for size (MinSizeRel, as for microcontrollers) keeps shorter strips on the stack. A
+// A build for size (MinSizeRel, as for microcontrollers) keeps shorter strips on the stack, so
+// that the masked fill, which calls these under its own frame, stays within a small stack. A
 // strip's length bounds the stack a call takes, never what it computes: every pixel of a strip
 // is found from the same neighbours whatever its length.
 #if KEL_SMALL_BUILD
@@ -199,17 +200,18 @@ void blur_apart(const FilterKernels &best, const uint8_t *in, size_t height, siz
     rows::smooth_across_and_down(best, row, inner, upper + 1, upper + width + 1, lower + 1);
     // The first and last columns, both found before either is stored: in a row of one pixel
     // they are the same column.
-    const uint8_t first = across_at(row, width, 0);
-    const uint8_t final = across_at(row, width, last);
-    const uint8_t first_out = smooth(upper[0], upper[width], first);
-    const uint8_t last_out = smooth(upper[last], upper[width + last], final);
-    lower[0] = first;
-    lower[last] = final;
+    const uint8_t first_across = across_at(row, width, 0);
+    const uint8_t last_across = across_at(row, width, last);
+    const uint8_t first_out = smooth(upper[0], upper[width], first_across);
+    const uint8_t last_out = smooth(upper[last], upper[width + last], last_across);
+    lower[0] = first_across;
+    lower[last] = last_across;
     upper[0] = first_out;
     upper[last] = last_out;
   }
   // The last input row has no output row to wait in: its pass finishes both last output rows,
-  // the last one being its own lower neighbour.
+  // the last one being its own lower neighbour. It is one row of the image, taken pixel by pixel
+  // in one loop with the edges clamped.
   uint8_t *const upper = out + (height - 2) * width;
   uint8_t *const lower = upper + width;
   const uint8_t *const row = in + (height - 1) * width;
@@ -225,8 +227,8 @@ void blur_apart(const FilterKernels &best, const uint8_t *in, size_t height, siz
 // overwritten, its last original byte carried on as the next strip's left neighbour; then the
 // vertical pass strip by strip down the columns, the original row above carried on the stack.
 void blur_in_place(const FilterKernels &best, uint8_t *pixels, size_t height, size_t width) {
-  // The strip's copy starts on an 8-byte boundary, its left neighbour in the byte before: a
-  // copy to an address off the boundary takes the slow path of the copy.
+  // The strip's copy starts on an 8-byte boundary, its left neighbour in the byte before: GCC
+  // copies a strip of bounded length with 8-byte moves, far slower to an address off it.
   alignas(8) uint8_t window[8 + kBlurStrip + 1];
   uint8_t *const strip = window + 8;
   for (size_t y = 0; y < height; ++y) {
