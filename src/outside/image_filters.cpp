@@ -14,7 +14,8 @@
 #include "image_filters_simd.h"
 #include "kel_outside.h"
 
-// A build for size (MinSizeRel, as for microcontrollers) keeps shorter strips on the stack. A
+// A build for size (MinSizeRel, as for microcontrollers) keeps shorter strips on the stack, so
+// that the masked fill, which calls these under its own frame, stays within a small stack. A
 // strip's length bounds the stack a call takes, never what it computes: every pixel of a strip
 // is found from the same neighbours whatever its length.
 #if KEL_SMALL_BUILD
@@ -93,65 +94,79 @@ namespace {
 
 // Whether `best` has a variant of its own for `entry`. The plain table has none, and there the
 // plain body does the whole row in one call; where the table is known when compiling, the test
-// goes away with the call to the variant.
+// goes away with the call to the variant, so a firmware's drivers call each body once.
 template <typename Entry>
 KEL_ALWAYS_INLINE bool has_variant(const FilterKernels &best, Entry FilterKernels::*entry) {
   return best.*entry != kPlainFilterKernels.*entry;
 }
 
 // The rows on the `best` table: its variant does the whole vectors from the start of the row, the
-// plain body the rest. Always inlined, so that where the table is known when compiling each
-// driver calls its plain bodies directly.
+// plain body the rest, unless the variant left nothing (many short rows make up a call, and each
+// would otherwise pay a call that does no pixel). Always inlined, so that where the table is
+// known when compiling each driver calls its plain bodies directly.
 namespace rows {
 
 KEL_ALWAYS_INLINE void smooth_triples(const FilterKernels &best, const uint8_t *src, size_t count,
                                       uint8_t *dst) {
-  const size_t done =
-      has_variant(best, &FilterKernels::smooth_triples) ? best.smooth_triples(src, count, dst) : 0;
+  size_t done = 0;
+  if (has_variant(best, &FilterKernels::smooth_triples)) {
+    done = best.smooth_triples(src, count, dst);
+    if (done == count) return;
+  }
   plain::smooth_triples(src + done, count - done, dst + done);
 }
 
 KEL_ALWAYS_INLINE void smooth_across_and_down(const FilterKernels &best, const uint8_t *row,
                                               size_t count, uint8_t *upper, const uint8_t *centre,
                                               uint8_t *lower) {
-  const size_t done = has_variant(best, &FilterKernels::smooth_across_and_down)
-                          ? best.smooth_across_and_down(row, count, upper, centre, lower)
-                          : 0;
+  size_t done = 0;
+  if (has_variant(best, &FilterKernels::smooth_across_and_down)) {
+    done = best.smooth_across_and_down(row, count, upper, centre, lower);
+    if (done == count) return;
+  }
   plain::smooth_across_and_down(row + done, count - done, upper + done, centre + done,
                                 lower + done);
 }
 
 KEL_ALWAYS_INLINE void smooth_down_carrying(const FilterKernels &best, uint8_t *above, uint8_t *row,
                                             const uint8_t *below, size_t count) {
-  const size_t done = has_variant(best, &FilterKernels::smooth_down_carrying)
-                          ? best.smooth_down_carrying(above, row, below, count)
-                          : 0;
+  size_t done = 0;
+  if (has_variant(best, &FilterKernels::smooth_down_carrying)) {
+    done = best.smooth_down_carrying(above, row, below, count);
+    if (done == count) return;
+  }
   plain::smooth_down_carrying(above + done, row + done, below + done, count - done);
 }
 
 KEL_ALWAYS_INLINE void blend_spread(const FilterKernels &best, const uint8_t *spread,
                                     const uint8_t *odd, size_t count, uint16_t *pairs) {
-  const size_t done = has_variant(best, &FilterKernels::blend_spread)
-                          ? best.blend_spread(spread, odd, count, pairs)
-                          : 0;
+  size_t done = 0;
+  if (has_variant(best, &FilterKernels::blend_spread)) {
+    done = best.blend_spread(spread, odd, count, pairs);
+    if (done == count) return;
+  }
   plain::blend_spread(spread + done, odd + done, count - done, pairs + done);
 }
 
 KEL_ALWAYS_INLINE void mix_eight_rows(const FilterKernels &best, const uint16_t *upper,
                                       const uint16_t *lower, size_t count, uint8_t *out,
                                       size_t stride) {
-  const size_t done = has_variant(best, &FilterKernels::mix_eight_rows)
-                          ? best.mix_eight_rows(upper, lower, count, out, stride)
-                          : 0;
+  size_t done = 0;
+  if (has_variant(best, &FilterKernels::mix_eight_rows)) {
+    done = best.mix_eight_rows(upper, lower, count, out, stride);
+    if (done == count) return;
+  }
   plain::mix_eight_rows(upper + done, lower + done, count - done, out + done, stride);
 }
 
 KEL_ALWAYS_INLINE void blend_rows_coarse(const FilterKernels &best, const uint16_t *top,
                                          const uint16_t *bottom, uint32_t weight_bottom,
                                          size_t count, uint8_t *out) {
-  const size_t done = has_variant(best, &FilterKernels::blend_rows_coarse)
-                          ? best.blend_rows_coarse(top, bottom, weight_bottom, count, out)
-                          : 0;
+  size_t done = 0;
+  if (has_variant(best, &FilterKernels::blend_rows_coarse)) {
+    done = best.blend_rows_coarse(top, bottom, weight_bottom, count, out);
+    if (done == count) return;
+  }
   plain::blend_rows_coarse(top + done, bottom + done, weight_bottom, count - done, out + done);
 }
 
@@ -185,17 +200,18 @@ void blur_apart(const FilterKernels &best, const uint8_t *in, size_t height, siz
     rows::smooth_across_and_down(best, row, inner, upper + 1, upper + width + 1, lower + 1);
     // The first and last columns, both found before either is stored: in a row of one pixel
     // they are the same column.
-    const uint8_t first = across_at(row, width, 0);
-    const uint8_t final = across_at(row, width, last);
-    const uint8_t first_out = smooth(upper[0], upper[width], first);
-    const uint8_t last_out = smooth(upper[last], upper[width + last], final);
-    lower[0] = first;
-    lower[last] = final;
+    const uint8_t first_across = across_at(row, width, 0);
+    const uint8_t last_across = across_at(row, width, last);
+    const uint8_t first_out = smooth(upper[0], upper[width], first_across);
+    const uint8_t last_out = smooth(upper[last], upper[width + last], last_across);
+    lower[0] = first_across;
+    lower[last] = last_across;
     upper[0] = first_out;
     upper[last] = last_out;
   }
   // The last input row has no output row to wait in: its pass finishes both last output rows,
-  // the last one being its own lower neighbour.
+  // the last one being its own lower neighbour. It is one row of the image, taken pixel by pixel
+  // in one loop with the edges clamped.
   uint8_t *const upper = out + (height - 2) * width;
   uint8_t *const lower = upper + width;
   const uint8_t *const row = in + (height - 1) * width;
@@ -211,18 +227,21 @@ void blur_apart(const FilterKernels &best, const uint8_t *in, size_t height, siz
 // overwritten, its last original byte carried on as the next strip's left neighbour; then the
 // vertical pass strip by strip down the columns, the original row above carried on the stack.
 void blur_in_place(const FilterKernels &best, uint8_t *pixels, size_t height, size_t width) {
-  uint8_t window[kBlurStrip + 2];
+  // The strip's copy starts on an 8-byte boundary, its left neighbour in the byte before: GCC
+  // copies a strip of bounded length with 8-byte moves, far slower to an address off it.
+  alignas(8) uint8_t window[8 + kBlurStrip + 1];
+  uint8_t *const strip = window + 8;
   for (size_t y = 0; y < height; ++y) {
     uint8_t *row = pixels + y * width;
     uint8_t left = row[0];
     for (size_t start = 0; start < width; start += kBlurStrip) {
       const size_t count = strip_length(start, width, kBlurStrip);
-      window[0] = left;
-      std::memcpy(window + 1, row + start, count);
-      // The byte after the strip is not written yet; past the last column the edge repeats.
-      window[count + 1] = start + count < width ? row[start + count] : window[count];
-      left = window[count];
-      rows::smooth_triples(best, window, count, row + start);
+      strip[-1] = left;
+      std::memcpy(strip, row + start, count);
+      // The bytes after the strip are not written yet; past the last column the edge repeats.
+      strip[count] = row[start + count < width ? start + count : width - 1];
+      left = strip[count - 1];
+      rows::smooth_triples(best, strip - 1, count, row + start);
     }
   }
   uint8_t above[kBlurStrip];
