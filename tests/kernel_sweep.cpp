@@ -115,34 +115,37 @@ const RowCase kRows[] = {
 
 void sweep_rows(const kel::Kernels &k, Tally &tally) {
   static uint8_t in[kBuffer], expected[kBuffer], got[kBuffer];
+  // Outputs on the widest vector's boundary, and off it so that a variant's lead-in runs.
+  static const size_t kOutputOffsets[] = {0, 17, 47};
   char what[96];
   for (const RowCase &row : kRows) {
     for (int setting = 0; setting < 5; ++setting) {
       const int p = setting % kPatterns;
       const int param = row.params[setting];
-      for (size_t length = 0; length <= kLongest; ++length) {
-        for (size_t shift = 0; shift < kWidest; shift += shift_step(length)) {
-          const uint32_t seed = static_cast<uint32_t>(length * 131 + shift * 7 + 1);
-          fill_input(static_cast<Pattern>(p), seed, in + kGuard + shift, length);
-          // Outputs start on the widest vector's boundary, guarded on both sides, and hold
-          // bytes the blends read.
-          for (size_t i = 0; i < 2 * kGuard + length; ++i) {
-            expected[i] = got[i] = static_cast<uint8_t>(i * 29);
+      for (const size_t out_offset : kOutputOffsets) {
+        for (size_t length = 0; length <= kLongest; ++length) {
+          const size_t step = out_offset == 0 ? shift_step(length) : 17;
+          for (size_t shift = 0; shift < kWidest; shift += step) {
+            const uint32_t seed = static_cast<uint32_t>(length * 131 + shift * 7 + 1);
+            fill_input(static_cast<Pattern>(p), seed, in + kGuard + shift, length);
+            // Guarded on both sides, the output holds bytes the blends read.
+            const size_t base = kGuard + out_offset, end = base + length + kGuard;
+            for (size_t i = 0; i < end; ++i) expected[i] = got[i] = static_cast<uint8_t>(i * 29);
+            memset(expected, kGuardByte, base), memset(got, kGuardByte, base);
+            memset(expected + base + length, kGuardByte, kGuard);
+            memset(got + base + length, kGuardByte, kGuard);
+            row.run(kel::kPlainKernels, in + kGuard + shift, length, expected + base, param);
+            const size_t done = row.run(k, in + kGuard + shift, length, got + base, param);
+            snprintf(what, sizeof what, "%s, setting %d, output %lu bytes off", kPatternNames[p],
+                     param, static_cast<unsigned long>(out_offset));
+            if (done > length) {
+              printf("FAIL %s %s, %s, length %lu: did %lu pixels\n", k.name, row.name, what,
+                     static_cast<unsigned long>(length), static_cast<unsigned long>(done));
+              ++tally.failed;
+              continue;
+            }
+            tally.same(k.name, row.name, what, length, shift, expected, got, end, base);
           }
-          memset(expected, kGuardByte, kGuard), memset(got, kGuardByte, kGuard);
-          memset(expected + kGuard + length, kGuardByte, kGuard);
-          memset(got + kGuard + length, kGuardByte, kGuard);
-          row.run(kel::kPlainKernels, in + kGuard + shift, length, expected + kGuard, param);
-          const size_t done = row.run(k, in + kGuard + shift, length, got + kGuard, param);
-          snprintf(what, sizeof what, "%s, setting %d", kPatternNames[p], param);
-          if (done > length) {
-            printf("FAIL %s %s, %s, length %lu: did %lu pixels\n", k.name, row.name, what,
-                   static_cast<unsigned long>(length), static_cast<unsigned long>(done));
-            ++tally.failed;
-            continue;
-          }
-          tally.same(k.name, row.name, what, length, shift, expected, got, 2 * kGuard + length,
-                     kGuard);
         }
       }
     }
