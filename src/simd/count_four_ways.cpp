@@ -20,7 +20,7 @@ size_t count_four_ways(const uint8_t *pixels, size_t count, uint32_t bits, uint3
   const uint32_t bins = uint32_t{1} << bits;
   uint32_t lane1[256], lane2[256], lane3[256];
   for (uint32_t bin = 0; bin < bins; ++bin) lane1[bin] = lane2[bin] = lane3[bin] = 0;
-  const auto bin_of = [shift](uint64_t word, unsigned byte) {
+  const auto bin_of = [&](uint64_t word, unsigned byte) {
     return static_cast<uint32_t>((word >> (8 * byte)) & 0xFF) >> shift;
   };
   size_t i = 0;
