@@ -77,10 +77,8 @@ size_t bytes_to_boundary(const uint8_t *at, size_t size, size_t count) {
 struct EveryLane {};
 
 // Writes the vector v to out[i ..] where keep(d, i, load) holds, and only in the first `head`
-// lanes when head is given (only where byte masks are native). Without native byte masks the
-// kept lanes are blended into the destination's own bytes and the whole vector is stored: a
-// transparent byte is written back with the value it holds, which the row's callers allow, and
-// one blend costs far less than a store per lane.
+// lanes when head is given. Rows that keep only some lanes run with native byte masks alone;
+// elsewhere a masked store of bytes is a loop with a branch per lane.
 template <class D, class V, class Keep, class Load>
 void store_vector(D d, size_t i, uint8_t *out, V v, const Keep &keep, const Load &load,
                   size_t head = 0) {
@@ -95,11 +93,7 @@ void store_vector(D d, size_t i, uint8_t *out, V v, const Keep &keep, const Load
   } else if constexpr (kEvery) {
     hn::StoreU(v, d, out + i);
   } else {
-#if KEL_NATIVE_BYTE_MASKS
     hn::BlendedStore(v, keep(d, i, load), d, out + i);
-#else
-    hn::StoreU(hn::IfThenElse(keep(d, i, load), v, hn::LoadU(d, out + i)), d, out + i);
-#endif
   }
 }
 
@@ -283,22 +277,43 @@ size_t BlendRow(const uint8_t *in, size_t count, uint8_t *out) {
       EveryLane(), [&](size_t first, size_t n) { plain::blend(in + first, n, out + first); });
 }
 
-// The transparent pixels keep their destination bytes (see store_vector).
-size_t PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  return for_each_vector(
-      in, out, count, [&](auto d, size_t i, const auto &load) { return load(d, in + i); },
-      [&](auto d, size_t i, const auto &load) { return hn::Ne(load(d, in + i), hn::Set(d, key)); },
-      [&](size_t first, size_t n) { plain::paste_keyed(in + first, n, key, out + first); });
-}
-
-size_t BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+// The transparent pixels keep their destination bytes. With native byte masks they are left out
+// of the store; elsewhere the row's bytes are chosen in a register, pixel or destination, and
+// the whole vector stored, each input read once (a transparent byte is so written back with the
+// value it holds, which the row's callers allow).
+template <bool kBlend>
+size_t keyed_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  const auto plain_rest = [&](size_t first, size_t n) {
+    (kBlend ? plain::blend_keyed : plain::paste_keyed)(in + first, n, key, out + first);
+  };
+#if KEL_NATIVE_BYTE_MASKS
   return for_each_vector(
       in, out, count,
       [&](auto d, size_t i, const auto &load) {
-        return floor_average(d, load(d, out + i), load(d, in + i));
+        const auto pixels = load(d, in + i);
+        return kBlend ? floor_average(d, load(d, out + i), pixels) : pixels;
       },
       [&](auto d, size_t i, const auto &load) { return hn::Ne(load(d, in + i), hn::Set(d, key)); },
-      [&](size_t first, size_t n) { plain::blend_keyed(in + first, n, key, out + first); });
+      plain_rest);
+#else
+  return for_each_vector(
+      in, out, count,
+      [&](auto d, size_t i, const auto &load) {
+        const auto pixels = load(d, in + i);
+        const auto under = load(d, out + i);
+        const auto changed = kBlend ? floor_average(d, under, pixels) : pixels;
+        return hn::IfThenElse(hn::Ne(pixels, hn::Set(d, key)), changed, under);
+      },
+      EveryLane(), plain_rest);
+#endif
+}
+
+size_t PasteRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  return keyed_row<false>(in, count, key, out);
+}
+
+size_t BlendRowWithKey(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
+  return keyed_row<true>(in, count, key, out);
 }
 
 size_t MaskRow(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
