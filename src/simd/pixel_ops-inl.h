@@ -202,6 +202,9 @@ size_t for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Valu
   }
   return count;
 #else
+  // Without native byte masks the keyed rows choose their bytes in a register, so every row here
+  // writes every pixel.
+  static_assert(std::is_same<Keep, EveryLane>::value, "rows without native masks write all");
   const hn::CappedTag<uint8_t, 16> d16;
   const size_t short_lanes = hn::Lanes(d16);
   // A short row, such as one of a pasted sprite, would spend more on the lead-in than it saves.
@@ -212,9 +215,7 @@ size_t for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Valu
     for (; lead - i >= short_lanes; i += short_lanes) {
       store_vector(d16, i, out, value(d16, i, whole), keep, whole);
     }
-    if constexpr (std::is_same<Keep, EveryLane>::value) {
-      i = long_row_vectors(in, out, i, count, value);
-    }
+    i = long_row_vectors(in, out, i, count, value);
   }
   for (; count - i >= lanes; i += lanes) store_vector(d, i, out, value(d, i, whole), keep, whole);
   for (; count - i >= short_lanes; i += short_lanes) {
