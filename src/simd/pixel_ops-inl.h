@@ -112,8 +112,7 @@ struct LoadWhole {
   }
 };
 
-// The shortest row whose lines are asked for ahead, and on targets without masked stores, whose
-// head is led to a vector boundary.
+// The shortest row whose lines are asked for ahead.
 constexpr size_t kLongRow = 4096;
 
 // Asks for the input line 2 KiB ahead, and for the output line there to be written: an image
@@ -155,27 +154,64 @@ size_t long_row_vectors(const uint8_t *in, uint8_t *out, size_t i, size_t count,
   return i;
 }
 
+// A row of at least one vector, in vectors of d: the lead vector, whole vectors from the
+// output's first boundary on (middle(i) may do a stretch of them first and return where it
+// stopped), and the last vector, ending at the row's end. Returns count.
+template <class D, class Value, class Middle>
+size_t overlapping_vectors(D d, uint8_t *out, size_t count, const Value &value,
+                           const Middle &middle) {
+  const size_t lanes = hn::Lanes(d);
+  const LoadWhole whole;
+  const size_t end = count - lanes;
+  const auto last = value(d, end, whole);
+  size_t i = bytes_to_boundary(out, lanes, count);
+  if (i != 0) {
+    const auto lead = value(d, 0, whole);
+    if (i <= end) {
+      const auto next = value(d, i, whole);
+      hn::StoreU(lead, d, out);
+      hn::StoreU(next, d, out + i);
+      i += lanes;
+    } else {
+      hn::StoreU(lead, d, out);  // the lead and the last vector cover the row
+    }
+  }
+  // Two vectors a turn: the loop's own count, compare and branch are otherwise a third of the
+  // instructions of a turn of the short rows.
+#pragma GCC unroll 2
+  for (i = middle(i); i <= end; i += lanes) hn::StoreU(value(d, i, whole), d, out + i);
+  hn::StoreU(last, d, out + end);
+  return count;
+}
+
+template <class D, class Value>
+size_t overlapping_vectors(D d, uint8_t *out, size_t count, const Value &value) {
+  return overlapping_vectors(d, out, count, value, [](size_t from) { return from; });
+}
+
 // Runs a row operation and returns how many pixels it did: value(d, i, load) is what the vector
 // of pixels from i becomes, keep(d, i, load) which of its lanes are written (EveryLane for all),
-// both reading vectors with load(d, address); plain(i, n) is the plain body on pixels i .. i + n -
-// 1, used only to lead a long row to a vector boundary. Full vectors start where the output is on a
-// full vector's boundary, so that no store splits a cache line (the input rows commonly share
-// the output's alignment, and then no load does either).
+// both reading vectors with load(d, address). Full vectors start where the output is on a full
+// vector's boundary, so that no store splits a cache line (the input rows commonly share the
+// output's alignment, and then no load does either): a split store costs about two, and a
+// sprite's rows seldom start on a boundary.
 //
 // With native byte masks the lanes before the boundary are one masked store of a vector that
 // lies inside the row, and those after the last full vector, or of a row shorter than one, are
-// one masked load and store: the whole row is done. The other targets lead long rows up to the
-// boundary with the plain body and 16-byte vectors, and end with 16-byte vectors, leaving the
-// last pixels to the plain body.
-template <class Value, class Keep, class Plain>
+// one masked load and store. Elsewhere every row writes every pixel, so the ends are whole
+// vectors that overlap their neighbours: the lead at the row's start and the last vector ending
+// at its end. A vector that overlaps another is made before either is stored, from the bytes as
+// the call found them, so the overlap is written twice with the same value, even where the
+// output is an input (the blends, or a row done in place). Rows shorter than the narrowest
+// vector are left to the plain body.
+template <class Value, class Keep>
 size_t for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Value &value,
-                       const Keep &keep, const Plain &plain) {
+                       const Keep &keep) {
   const D8 d;
   const size_t lanes = hn::Lanes(d);
+#if KEL_NATIVE_BYTE_MASKS
   const LoadWhole whole;
   size_t i = 0;
-#if KEL_NATIVE_BYTE_MASKS
-  (void)plain;
   if (count >= lanes && bytes_to_boundary(out, lanes, count) != 0) {
     i = bytes_to_boundary(out, lanes, count);
     // The next vector is read before the masked store: a load that overlaps the vector of a
@@ -202,26 +238,14 @@ size_t for_each_vector(const uint8_t *in, uint8_t *out, size_t count, const Valu
   }
   return count;
 #else
-  // Without native byte masks the keyed rows choose their bytes in a register, so every row here
-  // writes every pixel.
   static_assert(std::is_same<Keep, EveryLane>::value, "rows without native masks write all");
+  (void)keep;
   const hn::CappedTag<uint8_t, 16> d16;
-  const size_t short_lanes = hn::Lanes(d16);
-  // A short row, such as one of a pasted sprite, would spend more on the lead-in than it saves.
-  if (count >= kLongRow) {
-    i = bytes_to_boundary(out, short_lanes, count);
-    plain(size_t{0}, i);
-    const size_t lead = i + bytes_to_boundary(out + i, lanes, count - i);
-    for (; lead - i >= short_lanes; i += short_lanes) {
-      store_vector(d16, i, out, value(d16, i, whole), keep, whole);
-    }
-    i = long_row_vectors(in, out, i, count, value);
-  }
-  for (; count - i >= lanes; i += lanes) store_vector(d, i, out, value(d, i, whole), keep, whole);
-  for (; count - i >= short_lanes; i += short_lanes) {
-    store_vector(d16, i, out, value(d16, i, whole), keep, whole);
-  }
-  return i;
+  if (count < lanes)
+    return count < hn::Lanes(d16) ? 0 : overlapping_vectors(d16, out, count, value);
+  return overlapping_vectors(d, out, count, value, [&](size_t from) {
+    return count >= kLongRow ? long_row_vectors(in, out, from, count, value) : from;
+  });
 #endif
 }
 
@@ -242,10 +266,7 @@ size_t MoveRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) 
         const auto moved = change<kTowardWhite>(d, pixels, factor);
         return kTowardWhite ? hn::Add(pixels, moved) : hn::Sub(pixels, moved);
       },
-      EveryLane(),
-      [&](size_t first, size_t n) {
-        (kTowardWhite ? plain::brighten : plain::darken)(in + first, n, percent, out + first);
-      });
+      EveryLane());
 }
 
 size_t BrightenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out) {
@@ -257,12 +278,13 @@ size_t DarkenRow(const uint8_t *in, size_t count, uint16_t percent, uint8_t *out
 }
 
 // With native byte masks a row is copied in whole vectors, its ends masked, faster than the C
-// library's memmove copies it; elsewhere memmove, which the plain body calls, is the faster.
+// library's memmove copies it; elsewhere memmove, which the plain body calls, is as fast or
+// faster.
 size_t CopyRow(const uint8_t *in, size_t count, uint8_t *out) {
 #if KEL_NATIVE_BYTE_MASKS
   return for_each_vector(
       in, out, count, [&](auto d, size_t i, const auto &load) { return load(d, in + i); },
-      EveryLane(), [&](size_t first, size_t n) { plain::copy(in + first, n, out + first); });
+      EveryLane());
 #else
   (void)in, (void)count, (void)out;
   return 0;
@@ -275,7 +297,7 @@ size_t BlendRow(const uint8_t *in, size_t count, uint8_t *out) {
       [&](auto d, size_t i, const auto &load) {
         return floor_average(d, load(d, out + i), load(d, in + i));
       },
-      EveryLane(), [&](size_t first, size_t n) { plain::blend(in + first, n, out + first); });
+      EveryLane());
 }
 
 // The transparent pixels keep their destination bytes. With native byte masks they are left out
@@ -284,9 +306,6 @@ size_t BlendRow(const uint8_t *in, size_t count, uint8_t *out) {
 // value it holds, which the row's callers allow).
 template <bool kBlend>
 size_t keyed_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
-  const auto plain_rest = [&](size_t first, size_t n) {
-    (kBlend ? plain::blend_keyed : plain::paste_keyed)(in + first, n, key, out + first);
-  };
 #if KEL_NATIVE_BYTE_MASKS
   return for_each_vector(
       in, out, count,
@@ -294,8 +313,7 @@ size_t keyed_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
         const auto pixels = load(d, in + i);
         return kBlend ? floor_average(d, load(d, out + i), pixels) : pixels;
       },
-      [&](auto d, size_t i, const auto &load) { return hn::Ne(load(d, in + i), hn::Set(d, key)); },
-      plain_rest);
+      [&](auto d, size_t i, const auto &load) { return hn::Ne(load(d, in + i), hn::Set(d, key)); });
 #else
   return for_each_vector(
       in, out, count,
@@ -305,7 +323,7 @@ size_t keyed_row(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
         const auto changed = kBlend ? floor_average(d, under, pixels) : pixels;
         return hn::IfThenElse(hn::Ne(pixels, hn::Set(d, key)), changed, under);
       },
-      EveryLane(), plain_rest);
+      EveryLane());
 #endif
 }
 
@@ -323,7 +341,7 @@ size_t MaskRow(const uint8_t *in, size_t count, uint8_t key, uint8_t *out) {
       [&](auto d, size_t i, const auto &load) {
         return hn::IfThenElseZero(hn::Ne(load(d, in + i), hn::Set(d, key)), hn::Set(d, 1));
       },
-      EveryLane(), [&](size_t first, size_t n) { plain::mask(in + first, n, key, out + first); });
+      EveryLane());
 }
 
 // Destination rows of a paste lie a raster row apart, too far for the hardware's prefetching to

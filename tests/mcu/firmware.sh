@@ -6,7 +6,8 @@
 #       start-up, BUILD_DIR's libkel_images.a and libkel_images_outside.a, and newlib's
 #       semihosting
 #   tests/mcu/firmware.sh run BUILD_DIR ELF [QEMU FLAG...]
-#       runs the firmware; its output and exit status come back through semihosting
+#       runs the firmware; its output and exit status come back through semihosting. It is
+#       stopped after KEL_QEMU_SECONDS (default 120) seconds.
 set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd)
 command=$1 build=$2
@@ -36,7 +37,9 @@ case $command in
   run)
     elf=$1
     shift
-    timeout 900 qemu-system-arm -M "$board" -nographic -monitor none -serial none \
+    # Every firmware here ends in seconds. A fault that makes one spin must not leave the
+    # emulator running after the test that started it was killed, so it has its own limit.
+    exec timeout "${KEL_QEMU_SECONDS:-120}" qemu-system-arm -M "$board" -nographic -monitor none -serial none \
       -semihosting-config enable=on,target=native "$@" -kernel "$elf"
     ;;
   *)
