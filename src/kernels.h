@@ -61,6 +61,10 @@ struct Kernels {
   // Asks for the lines of count bytes from `at` to be brought in for writing: a hint that reads
   // and writes nothing. `at` may lie past the raster; it is used as a number, never read.
   void (*prefetch_for_writing)(uintptr_t at, size_t count);
+  // Whether paste_keyed reads its destination row (it chooses each byte in a register and stores
+  // whole words or vectors). The row then brings those lines in itself, and asking for them ahead
+  // as well only adds work; a row that stores only its opaque pixels gains from the hint.
+  bool paste_keyed_reads_out;
 
   // Statistics; both add to what the caller's accumulators hold. count_bins counts each pixel
   // into hist[pixel >> (8 - bits)] (bits 0 .. 8); counts stay below 2^31.
@@ -107,6 +111,7 @@ inline constexpr Kernels kPlainKernels = {"plain",
                                           plain::paste_keyed,
                                           plain::blend_keyed,
                                           plain::prefetch_for_writing,
+                                          false,
                                           plain::count_bins,
                                           plain::sum_pixels,
                                           plain::rotate_u8,
@@ -179,6 +184,7 @@ inline constexpr Kernels kCompiledKernels = {"MVE",
                                              mve::paste_keyed,
                                              mve::blend_keyed,
                                              plain::prefetch_for_writing,
+                                             false,
                                              mve::count_bins,
                                              mve::sum_pixels,
                                              mve::rotate_u8,
@@ -195,6 +201,7 @@ inline constexpr Kernels kCompiledKernels = {"DSP",
                                              dsp::paste_keyed,
                                              dsp::blend_keyed,
                                              plain::prefetch_for_writing,
+                                             true,
                                              plain::count_bins,
                                              dsp::sum_pixels,
                                              plain::rotate_u8,

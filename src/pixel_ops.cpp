@@ -87,7 +87,8 @@ void copy_in_order(const uint8_t *from, size_t count, uint8_t *to) {
 // How a paste or a blend writes a row, without a key and with one. A paste only writes its
 // destination rows, so it asks for the next one ahead: destination rows lie a raster row apart,
 // too far for the hardware's prefetching to follow. A blend reads its destination too, and the
-// hardware's prefetching of that read is enough.
+// hardware's prefetching of that read is enough; so does a keyed paste on the tables whose rows
+// choose their bytes in a register.
 struct Compositing {
   kel::Row kel::Kernels::*opaque;
   kel::RowWith<uint8_t> kel::Kernels::*keyed;
@@ -106,11 +107,12 @@ void composite(const Compositing &rule, uint8_t *dst, int32_t dst_height, int32_
   if (rect.empty()) return;
   const kel::Kernels &best = kel::kernels();
   const size_t count = static_cast<size_t>(rect.last_col - rect.first_col + 1);
+  const bool ahead = rule.writes_only && (key > 255 || !best.paste_keyed_reads_out);
   for (int64_t row = rect.first_row; row <= rect.last_row; ++row) {
     // Both offsets lie inside their rasters, which the caller sized, so they fit ptrdiff_t.
     const uint8_t *from = src + static_cast<ptrdiff_t>(row * src_width + rect.first_col);
     uint8_t *to = dst + static_cast<ptrdiff_t>((y + row) * dst_width + x + rect.first_col);
-    if (rule.writes_only) {
+    if (ahead) {
       best.prefetch_for_writing(reinterpret_cast<uintptr_t>(to) + static_cast<uintptr_t>(dst_width),
                                 count);
     }

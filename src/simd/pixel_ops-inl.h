@@ -30,6 +30,9 @@ namespace hn = hwy::HWY_NAMESPACE;
 
 using D8 = hn::ScalableTag<uint8_t>;
 
+// Without native byte masks the keyed paste reads its destination (see keyed_row).
+constexpr bool kPasteKeyedReadsOut = KEL_PIXEL_OPS_VECTORS && !KEL_NATIVE_BYTE_MASKS;
+
 #if KEL_PIXEL_OPS_VECTORS
 // floor(percent * base / 100) for a base of at most 255 is (base * factor) >> 16 with
 // factor = ceil(percent * 2^16 / 100) when percent is below 100: factor / 2^16 exceeds
@@ -133,8 +136,8 @@ inline void prefetch_ahead(const uint8_t *in, const uint8_t *out) {
 #endif
 }
 
-// The whole vectors of a long row from pixel i on, two at a time, each line asked for ahead;
-// returns the first pixel left.
+// The whole vectors of a long row from pixel i on, a turn of at least two vectors and one whole
+// line, each line asked for ahead once; returns the first pixel left.
 template <class Value>
 size_t long_row_vectors(const uint8_t *in, uint8_t *out, size_t i, size_t count,
                         const Value &value) {
@@ -142,14 +145,13 @@ size_t long_row_vectors(const uint8_t *in, uint8_t *out, size_t i, size_t count,
   const size_t lanes = hn::Lanes(d);
   const LoadWhole whole;
   constexpr size_t kLine = 64;
-  for (; count - i >= 2 * lanes; i += 2 * lanes) {
-    for (size_t line = 0; line < 2 * lanes; line += kLine) {
+  const size_t turn = 2 * lanes > kLine ? 2 * lanes : kLine;
+  for (; count - i >= turn; i += turn) {
+    for (size_t line = 0; line < turn; line += kLine) {
       prefetch_ahead(in + i + line, out + i + line);
     }
-    const auto first = value(d, i, whole);
-    const auto second = value(d, i + lanes, whole);
-    hn::StoreU(first, d, out + i);
-    hn::StoreU(second, d, out + i + lanes);
+#pragma GCC unroll 4
+    for (size_t v = 0; v < turn; v += lanes) hn::StoreU(value(d, i + v, whole), d, out + i + v);
   }
   return i;
 }
