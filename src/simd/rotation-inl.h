@@ -64,6 +64,18 @@ Positions first_positions(D32 d, const LaneRun &row) {
           hn::Add(hn::Set(d, row.y), hn::Mul(lane, hn::Set(d, row.step_y)))};
 }
 
+// The positions of the run's last whole vector, the one that ends at its last pixel (the run has
+// at least `lanes` pixels). A row that ends there overlaps the vector before it, so it writes no
+// pixel that a vector has not, with the same value twice, and leaves no tail to the plain body.
+Positions last_positions(D32 d, const LaneRun &row, size_t lanes) {
+  const auto back = static_cast<int64_t>(row.count - lanes);
+  LaneRun last = row;
+  // Positions of the run, so inside the source and inside 32 bits.
+  last.x = static_cast<int32_t>(row.x + back * row.step_x);
+  last.y = static_cast<int32_t>(row.y + back * row.step_y);
+  return first_positions(d, last);
+}
+
 // The byte offset of each lane's whole-pixel position (x0, y0).
 V32 pixel_offsets(const Positions &p, V32 width) {
   return hn::Add(hn::Mul(hn::ShiftRight<14>(p.y), width), hn::ShiftRight<14>(p.x));
@@ -186,20 +198,25 @@ size_t bilinear_row(const LaneRun &row, Pixel *out) {
   // A signed pixel s is read as the unsigned s + 128 (its top bit flipped), which needs no sign
   // extension; bilinear_pixels takes the 128 back off.
   const V32 pair_top_bits = hn::Set(d, 0x00800080);
-  size_t done = 0;
-  for (; done + lanes <= count; done += lanes) {
-    NeighbourPairs pixels = reader.pairs(d, pixel_offsets(p, width));
+  const auto vector_at = [&](const Positions &q, size_t at) {
+    NeighbourPairs pixels = reader.pairs(d, pixel_offsets(q, width));
     if (kSigned) {
       pixels.top = hn::Xor(pixels.top, pair_top_bits);
       pixels.bottom = hn::Xor(pixels.bottom, pair_top_bits);
     }
-    const V32 values =
-        bilinear_pixels<kSigned>(d, pixels, hn::And(p.x, fraction), hn::And(p.y, fraction));
-    store_pixels(values, out + done);
+    store_pixels(
+        bilinear_pixels<kSigned>(d, pixels, hn::And(q.x, fraction), hn::And(q.y, fraction)),
+        out + at);
+  };
+  size_t done = 0;
+  for (; done + lanes <= count; done += lanes) {
+    vector_at(p, done);
     p.x = hn::Add(p.x, advance_x);
     p.y = hn::Add(p.y, advance_y);
   }
-  return done;
+  if (done == count || count < lanes) return done;
+  vector_at(last_positions(d, row, lanes), count - lanes);
+  return count;
 }
 
 size_t BilinearRowU8(const RotationRun &run, uint8_t *out) {
@@ -209,6 +226,12 @@ size_t BilinearRowU8(const RotationRun &run, uint8_t *out) {
 size_t BilinearRowI8(const RotationRun &run, int8_t *out) {
   return fits_lanes(run, 1) ? bilinear_row<true>(lanes_of(run), out) : 0;
 }
+
+// x86 from AVX2 on shifts each lane by a count of its own in one instruction, which keeps the
+// move off the shuffle port that the gather and the narrowing store already crowd (x86 is
+// little-endian, so byte k of a word sits 8 * k bits up). Elsewhere a byte shuffle does it, in
+// either byte order, where a per-lane shift would be several instructions.
+#define KEL_SHIFT_EACH_LANE (HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX2)
 
 // One 4-byte read per lane holds the pixel: at its own offset where the source has three more
 // bytes after it, else ending at it (the last pixels of the source). Only sources of four pixels
@@ -222,26 +245,37 @@ size_t nearest_row(const LaneRun &row, int8_t *out) {
   const V32 advance_y = hn::Set(d, row.step_y * static_cast<int32_t>(lanes));
   const V32 last_read = hn::Set(d, row.width * row.height - 4);
   const V32 width = hn::Set(d, row.width);
+#if !KEL_SHIFT_EACH_LANE
   // Shuffle indices as in NeighbourReader, for each lane's top byte; its other three are zeroed.
   const V32 lane_top =
       hn::Or(hn::ShiftLeft<26>(hn::And(hn::Iota(d, 0), hn::Set(d, 3))), hn::Set(d, 0x808080));
+#endif
   const size_t count = row.count;
-  size_t done = 0;
-  for (; done + lanes <= count; done += lanes) {
-    const V32 offset = pixel_offsets(p, width);
+  const auto vector_at = [&](const Positions &q, size_t at) {
+    const V32 offset = pixel_offsets(q, width);
     const V32 read_at = hn::Min(offset, last_read);
     const V32 word = hn::GatherOffset(d, words, read_at);
-    // The pixel is byte (offset - read_at) of the word in memory order: a byte shuffle moves it
-    // to the top, in either byte order (a shift by its number would assume little-endian), and
-    // the arithmetic shift sign-extends it.
+    // The pixel is byte (offset - read_at) of the word in memory order; it is moved to the top
+    // and the arithmetic shift sign-extends it.
+#if KEL_SHIFT_EACH_LANE
+    const V32 up = hn::Sub(hn::Set(d, 24), hn::ShiftLeft<3>(hn::Sub(offset, read_at)));
+    const V32 value = hn::ShiftRight<24>(hn::Shl(word, up));
+#else
     const V32 pick = hn::Or(hn::ShiftLeft<24>(hn::Sub(offset, read_at)), lane_top);
     const V32 value = hn::ShiftRight<24>(hn::TableLookupBytesOr0(word, pick));
+#endif
     // -128 marks uncovered pixels, so a covered -128 is stored as -127.
-    store_pixels(hn::Max(value, hn::Set(d, -127)), out + done);
+    store_pixels(hn::Max(value, hn::Set(d, -127)), out + at);
+  };
+  size_t done = 0;
+  for (; done + lanes <= count; done += lanes) {
+    vector_at(p, done);
     p.x = hn::Add(p.x, advance_x);
     p.y = hn::Add(p.y, advance_y);
   }
-  return done;
+  if (done == count || count < lanes) return done;
+  vector_at(last_positions(d, row, lanes), count - lanes);
+  return count;
 }
 
 size_t NearestRowI8(const RotationRun &run, int8_t *out) {
