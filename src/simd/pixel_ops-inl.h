@@ -79,9 +79,9 @@ size_t bytes_to_boundary(const uint8_t *at, size_t size, size_t count) {
 // The `keep` of a row operation that writes every pixel.
 struct EveryLane {};
 
+#if KEL_NATIVE_BYTE_MASKS
 // Writes the vector v to out[i ..] where keep(d, i, load) holds, and only in the first `head`
-// lanes when head is given. Rows that keep only some lanes run with native byte masks alone;
-// elsewhere a masked store of bytes is a loop with a branch per lane.
+// lanes when head is given.
 template <class D, class V, class Keep, class Load>
 void store_vector(D d, size_t i, uint8_t *out, V v, const Keep &keep, const Load &load,
                   size_t head = 0) {
@@ -99,6 +99,7 @@ void store_vector(D d, size_t i, uint8_t *out, V v, const Keep &keep, const Load
     hn::BlendedStore(v, keep(d, i, load), d, out + i);
   }
 }
+#endif
 
 // Loads a whole vector, once. Left alone, the compiler folds the load into each instruction
 // that uses the pixels, and every one of those loads splits a cache line when the input is not

@@ -64,20 +64,6 @@ Positions first_positions(D32 d, const LaneRun &row) {
           hn::Add(hn::Set(d, row.y), hn::Mul(lane, hn::Set(d, row.step_y)))};
 }
 
-// The positions of the run's last whole vector, the one that ends at its last pixel (the run has
-// at least `lanes` pixels). A row that ends there overlaps the vector before it, so it writes no
-// pixel that a vector has not, with the same value twice, and leaves no tail to the plain body.
-// The nearest-neighbour row ends so; the bilinear rows measured slower on AVX2 with the extra
-// turn than with the plain body's tail, and leave it to the plain body.
-Positions last_positions(D32 d, const LaneRun &row, size_t lanes) {
-  const auto back = static_cast<int64_t>(row.count - lanes);
-  LaneRun last = row;
-  // Positions of the run, so inside the source and inside 32 bits.
-  last.x = static_cast<int32_t>(row.x + back * row.step_x);
-  last.y = static_cast<int32_t>(row.y + back * row.step_y);
-  return first_positions(d, last);
-}
-
 // The byte offset of each lane's whole-pixel position (x0, y0).
 V32 pixel_offsets(const Positions &p, V32 width) {
   return hn::Add(hn::Mul(hn::ShiftRight<14>(p.y), width), hn::ShiftRight<14>(p.x));
@@ -224,12 +210,6 @@ size_t BilinearRowI8(const RotationRun &run, int8_t *out) {
   return fits_lanes(run, 1) ? bilinear_row<true>(lanes_of(run), out) : 0;
 }
 
-// x86 from AVX2 on shifts each lane by a count of its own in one instruction, which keeps the
-// move off the shuffle port that the gather and the narrowing store already crowd (x86 is
-// little-endian, so byte k of a word sits 8 * k bits up). Elsewhere a byte shuffle does it, in
-// either byte order, where a per-lane shift would be several instructions.
-#define KEL_SHIFT_EACH_LANE (HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX2)
-
 // One 4-byte read per lane holds the pixel: at its own offset where the source has three more
 // bytes after it, else ending at it (the last pixels of the source). Only sources of four pixels
 // or more are taken, so both reads stay inside.
@@ -242,37 +222,26 @@ size_t nearest_row(const LaneRun &row, int8_t *out) {
   const V32 advance_y = hn::Set(d, row.step_y * static_cast<int32_t>(lanes));
   const V32 last_read = hn::Set(d, row.width * row.height - 4);
   const V32 width = hn::Set(d, row.width);
-#if !KEL_SHIFT_EACH_LANE
   // Shuffle indices as in NeighbourReader, for each lane's top byte; its other three are zeroed.
   const V32 lane_top =
       hn::Or(hn::ShiftLeft<26>(hn::And(hn::Iota(d, 0), hn::Set(d, 3))), hn::Set(d, 0x808080));
-#endif
   const size_t count = row.count;
-  // One turn past the whole vectors, from the last vector's positions, ends the row.
   size_t done = 0;
-  for (;;) {
-    for (; done + lanes <= count; done += lanes) {
-      const V32 offset = pixel_offsets(p, width);
-      const V32 read_at = hn::Min(offset, last_read);
-      const V32 word = hn::GatherOffset(d, words, read_at);
-      // The pixel is byte (offset - read_at) of the word in memory order; it is moved to the
-      // top and the arithmetic shift sign-extends it.
-#if KEL_SHIFT_EACH_LANE
-      const V32 up = hn::Sub(hn::Set(d, 24), hn::ShiftLeft<3>(hn::Sub(offset, read_at)));
-      const V32 value = hn::ShiftRight<24>(hn::Shl(word, up));
-#else
-      const V32 pick = hn::Or(hn::ShiftLeft<24>(hn::Sub(offset, read_at)), lane_top);
-      const V32 value = hn::ShiftRight<24>(hn::TableLookupBytesOr0(word, pick));
-#endif
-      // -128 marks uncovered pixels, so a covered -128 is stored as -127.
-      store_pixels(hn::Max(value, hn::Set(d, -127)), out + done);
-      p.x = hn::Add(p.x, advance_x);
-      p.y = hn::Add(p.y, advance_y);
-    }
-    if (done == count || count < lanes) return done;
-    p = last_positions(d, row, lanes);
-    done = count - lanes;
+  for (; done + lanes <= count; done += lanes) {
+    const V32 offset = pixel_offsets(p, width);
+    const V32 read_at = hn::Min(offset, last_read);
+    const V32 word = hn::GatherOffset(d, words, read_at);
+    // The pixel is byte (offset - read_at) of the word in memory order: a byte shuffle moves it
+    // to the top, in either byte order (a shift by its number would assume little-endian), and
+    // the arithmetic shift sign-extends it.
+    const V32 pick = hn::Or(hn::ShiftLeft<24>(hn::Sub(offset, read_at)), lane_top);
+    const V32 value = hn::ShiftRight<24>(hn::TableLookupBytesOr0(word, pick));
+    // -128 marks uncovered pixels, so a covered -128 is stored as -127.
+    store_pixels(hn::Max(value, hn::Set(d, -127)), out + done);
+    p.x = hn::Add(p.x, advance_x);
+    p.y = hn::Add(p.y, advance_y);
   }
+  return done;
 }
 
 size_t NearestRowI8(const RotationRun &run, int8_t *out) {
